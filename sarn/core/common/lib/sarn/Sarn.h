@@ -1,0 +1,9 @@
+// sarn: the client library of the Kerno service. Include this one header for everything.
+#pragma once
+
+#include "vek/Vek.h"
+#include "wynbaselib/Bytestream.h"
+#include "wynbaselib/Gzip.h"
+
+#include "sarn/Export.h"
+#include "sarn/Version.h"
