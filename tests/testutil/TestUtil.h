@@ -1,0 +1,39 @@
+// Shared test helpers: chunk splitting for incremental readers, pool checks, corpus paths.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "vek/Vek.h"
+
+namespace sarntest {
+
+// The ways an incremental reader is fed one input: whole, one byte at a time, and split in
+// two at every position. Each call of `feed` receives one complete feeding as a list of
+// chunks and a label describing it (for failure messages).
+void ForEachSplit(std::string_view input,
+                  const std::function<void(const std::vector<std::string_view>& chunks, const std::string& label)>& feed);
+
+// Splits `input` into chunks of `size` bytes (the last one shorter).
+std::vector<std::string_view> FixedChunks(std::string_view input, size_t size);
+
+// A pool that a test uses for everything it allocates; at the end of the test every byte
+// must have been returned (a leak fails the test, not just the sanitizer build).
+class PoolTest : public ::testing::Test {
+ protected:
+  PoolTest() : poolM("test") {}
+  void TearDown() override { EXPECT_EQ(poolM.GetUsedBytes(), 0u) << "bytes left in the test pool"; }
+  VekMempool poolM;
+};
+
+// A folder of the shared public corpora, or "" when it is absent (tests then skip).
+std::string CorpusDir(const std::string& name);
+
+// Reads a whole file; false when it cannot be read.
+bool ReadFile(const std::string& path, std::string& out);
+
+}  // namespace sarntest
