@@ -6,4 +6,7 @@
 #include "wynbaselib/Gzip.h"
 
 #include "sarn/Export.h"
+#include "sarn/SarnObject.h"
+#include "sarn/Schema.h"
+#include "sarn/StructInfoMap.h"
 #include "sarn/Version.h"
