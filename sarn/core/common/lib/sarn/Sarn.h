@@ -10,3 +10,5 @@
 #include "sarn/Schema.h"
 #include "sarn/StructInfoMap.h"
 #include "sarn/Version.h"
+#include "sarn/ByteBuffer.h"
+#include "sarn/Json.h"

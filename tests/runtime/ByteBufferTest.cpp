@@ -1,0 +1,103 @@
+#include <climits>
+#include <string>
+
+#include "sarn/Sarn.h"
+#include "testutil/TestUtil.h"
+
+namespace {
+
+using ByteBufferTest = sarntest::PoolTest;
+
+std::string Contents(const sarn::ByteBuffer& buffer) {
+  return std::string(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength());
+}
+
+unsigned long Capacity(const sarn::ByteBuffer& buffer) { return buffer.bufferM.bytesM->GetLength(); }
+
+TEST_F(ByteBufferTest, SingleBytesGrowByAtLeast256AndKeepASpareByte) {
+  sarn::ByteBuffer buffer(&poolM);
+  EXPECT_EQ(Capacity(buffer), 0u);
+  EXPECT_EQ(buffer.GetLength(), 0u);
+  std::string expected;
+  std::vector<unsigned long> capacities;
+  for (int i = 0; i < 1100; ++i) {
+    unsigned long before = Capacity(buffer);
+    ASSERT_TRUE(buffer.AppendByte(static_cast<unsigned char>(i)));
+    expected.push_back(static_cast<char>(i));
+    if (Capacity(buffer) != before) capacities.push_back(Capacity(buffer));
+    ASSERT_LT(buffer.GetLength(), Capacity(buffer)) << "no spare byte after " << i + 1 << " bytes";
+  }
+  EXPECT_EQ(capacities, (std::vector<unsigned long>{257, 514, 771, 1028, 1285}));
+  EXPECT_EQ(Contents(buffer), expected);
+}
+
+TEST_F(ByteBufferTest, RunsGrowByTheirLengthPlusAFifth) {
+  sarn::ByteBuffer buffer(&poolM);
+  std::string big(10000, 'x');
+  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(big.data()), big.size()));
+  EXPECT_EQ(Capacity(buffer), 10256u);
+  std::string fill(255, 'y');
+  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(fill.data()), fill.size()));
+  EXPECT_EQ(Capacity(buffer), 10256u) << "10,255 of 10,256 bytes used leaves the spare byte";
+  ASSERT_TRUE(buffer.AppendByte('z'));
+  EXPECT_EQ(Capacity(buffer), 10256u + 1 + 2051);
+  EXPECT_TRUE(buffer.AppendBytes(nullptr, 0));
+  EXPECT_EQ(Contents(buffer), big + fill + "z");
+}
+
+TEST_F(ByteBufferTest, AppendStringStopsAtTheNulAndRefusesImpossibleLengths) {
+  sarn::ByteBuffer buffer(&poolM);
+  EXPECT_TRUE(buffer.AppendString("ab\0cd"));
+  EXPECT_TRUE(buffer.AppendString(nullptr));
+  EXPECT_TRUE(buffer.AppendString(""));
+  EXPECT_EQ(Contents(buffer), "ab");
+  unsigned char byte = 1;
+  EXPECT_FALSE(buffer.AppendBytes(&byte, ULONG_MAX)) << "a length that would wrap the capacity";
+  EXPECT_FALSE(buffer.AppendBytes(&byte, ULONG_MAX - 300));
+  EXPECT_EQ(Contents(buffer), "ab");
+}
+
+TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
+  ref<sarn::Vek1ByteBufferCore> core = new (&poolM) sarn::Vek1ByteBufferCore();
+  EXPECT_EQ(core->GetLength(), 0u);
+  EXPECT_EQ(core->GetCapacity(), 0u);
+  std::vector<size_t> capacities;
+  for (int i = 0; i < 17; ++i) {
+    size_t before = core->GetCapacity();
+    ASSERT_TRUE(core->AppendByte(static_cast<unsigned char>('a' + i)));
+    if (core->GetCapacity() != before) capacities.push_back(core->GetCapacity());
+  }
+  EXPECT_EQ(capacities, (std::vector<size_t>{8, 16, 32}));
+  const unsigned char run[] = {'X', 'Y', 'Z'};
+  ASSERT_TRUE(core->AppendBytes(run, 3));
+  EXPECT_EQ(core->GetLength(), 20u);
+  EXPECT_EQ(core->GetCapacity(), 20u) << "a run reallocates to exactly the new length";
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(core->GetData()), core->GetLength()), "abcdefghijklmnopqXYZ");
+  // Only the low 32 bits of a run's length count.
+  EXPECT_TRUE(core->AppendBytes(run, 1ul << 32));
+  EXPECT_EQ(core->GetLength(), 20u);
+  EXPECT_FALSE(core->AppendBytes(run, 0x80000000ul)) << "past the platform's 2 GiB";
+  EXPECT_EQ(core->GetLength(), 20u);
+
+  ref<sarn::Vek1ByteBufferCore> small = new (&poolM) sarn::Vek1ByteBufferCore();
+  ASSERT_TRUE(small->AppendBytes(run, 3));
+  EXPECT_EQ(small->GetCapacity(), 8u) << "at least 8 bytes";
+}
+
+TEST_F(ByteBufferTest, CoreEqualityComparesLengthAndBytes) {
+  ref<sarn::Vek1ByteBufferCore> a = new (&poolM) sarn::Vek1ByteBufferCore();
+  ref<sarn::Vek1ByteBufferCore> b = new (&poolM) sarn::Vek1ByteBufferCore();
+  EXPECT_TRUE(a->FEqual(b.Get()));
+  EXPECT_FALSE(a->FEqual(nullptr));
+  a->AppendBytes(reinterpret_cast<const unsigned char*>("abc"), 3);
+  b->AppendByte('a');
+  b->AppendByte('b');
+  EXPECT_FALSE(a->FEqual(b.Get()));
+  b->AppendByte('d');
+  EXPECT_FALSE(a->FEqual(b.Get()));
+  ref<sarn::Vek1ByteBufferCore> c = new (&poolM) sarn::Vek1ByteBufferCore();
+  c->AppendBytes(reinterpret_cast<const unsigned char*>("abc"), 3);
+  EXPECT_TRUE(a->FEqual(c.Get()));
+}
+
+}  // namespace
