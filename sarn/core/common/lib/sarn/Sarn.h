@@ -12,3 +12,5 @@
 #include "sarn/Version.h"
 #include "sarn/ByteBuffer.h"
 #include "sarn/Json.h"
+#include "sarn/Base64.h"
+#include "sarn/Dict.h"

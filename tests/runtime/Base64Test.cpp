@@ -1,0 +1,153 @@
+#include <string>
+
+#include "sarn/Sarn.h"
+#include "testutil/TestUtil.h"
+
+namespace {
+
+using Base64Test = sarntest::PoolTest;
+
+std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+std::string Str(const ref<vek::ByteBuffer>& bytes) {
+  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
+}
+
+class Base64Pool : public Base64Test {
+ protected:
+  ref<vek::ByteBuffer> Bytes(const std::string& text) { return vek::ByteBuffer::New(&poolM, text.data(), text.size()); }
+  VekString Text(const std::string& text) { return VekString::FromUtf8Bytes(&poolM, text.size(), text.data()); }
+  std::string Encode(const std::string& bytes) { return Str(sarn::EncodeBase64(&poolM, Bytes(bytes))); }
+  // The decoded bytes, or "<fail>" when the text does not decode (checked through both entry
+  // points, which must agree).
+  std::string Decode(const std::string& text) {
+    ref<vek::ByteBuffer> out = vek::ByteBuffer::New(&poolM, "old", 3);
+    bool fOk = sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, sarn::Base64::DEFAULT_TERMINATOR).Decode(&poolM, Bytes(text), out);
+    ref<vek::ByteBuffer> viaText = sarn::DecodeBase64(&poolM, Text(text));
+    EXPECT_TRUE(viaText) << "DecodeBase64 never gives null";
+    if (!fOk) {
+      EXPECT_EQ(Str(out), "old") << "a failed decode leaves the output alone";
+      EXPECT_EQ(viaText->GetLength(), 0u);
+      return "<fail>";
+    }
+    EXPECT_EQ(Str(viaText), Str(out));
+    return Str(out);
+  }
+};
+
+TEST_F(Base64Pool, EncodesWithPaddingAndBothCodeSets) {
+  EXPECT_EQ(Encode(""), "");
+  EXPECT_EQ(Encode("f"), "Zg==");
+  EXPECT_EQ(Encode("fo"), "Zm8=");
+  EXPECT_EQ(Encode("foo"), "Zm9v");
+  EXPECT_EQ(Encode("foob"), "Zm9vYg==");
+  EXPECT_EQ(Encode("\xFB\xFF"), "+/8=");
+  std::string all;
+  for (int i = 0; i < 256; ++i) all.push_back(static_cast<char>(i));
+  EXPECT_EQ(Decode(Encode(all)), all);
+
+  sarn::Base64 other(sarn::Base64::YAHOO_CODE_SET, sarn::Base64::YAHOO_TERMINATOR);
+  EXPECT_FALSE(other.fBadCodeSetM);
+  ref<vek::ByteBuffer> text;
+  other.Encode(&poolM, Bytes("\xFB\xFF"), text);
+  EXPECT_EQ(Str(text), "._8-");
+  ref<vek::ByteBuffer> back;
+  ASSERT_TRUE(other.Decode(&poolM, text, back));
+  EXPECT_EQ(Str(back), "\xFB\xFF");
+  EXPECT_FALSE(other.Decode(&poolM, Bytes("+/8="), back)) << "the other code set's characters";
+  other.Encode(&poolM, ref<vek::ByteBuffer>(), text);
+  EXPECT_EQ(text->GetLength(), 0u);
+}
+
+TEST_F(Base64Pool, DecodeAcceptsPaddingOnlyAtTheEnd) {
+  EXPECT_EQ(Decode("Zm9v"), "foo");
+  EXPECT_EQ(Decode("Zm8="), "fo");
+  EXPECT_EQ(Decode("Zg=="), "f");
+  EXPECT_EQ(Decode(""), "");
+  EXPECT_EQ(Decode("Zg=x"), "f") << "the character after padding is not examined";
+  EXPECT_EQ(Decode("Zm8=Zg=="), "<fail>");
+  EXPECT_EQ(Decode("Zg==Zm9v"), "<fail>");
+  EXPECT_EQ(Decode("Zm9"), "<fail>");
+  EXPECT_EQ(Decode("Z!=="), "<fail>");
+  EXPECT_EQ(Decode("Z==="), "<fail>");
+  EXPECT_EQ(Decode("===="), "<fail>");
+  EXPECT_EQ(Decode("Zm9vZm8x"), "foofo1");
+  EXPECT_EQ(Decode("Zm9vZ!8x"), "<fail>");
+  EXPECT_EQ(Decode("Zm9vZm8"), "<fail>");
+  EXPECT_EQ(Decode(std::string("Zm\0v", 4)), "<fail>");
+  EXPECT_EQ(Decode("Zh=="), "f") << "unused low bits are ignored";
+  EXPECT_EQ(Decode("Zm9=x"), "<fail>");
+}
+
+TEST_F(Base64Pool, BadCodeSetsAreRejected) {
+  std::string repeated = sarn::Base64::DEFAULT_CODE_SET;
+  repeated[63] = 'A';
+  std::string withTerminator = sarn::Base64::DEFAULT_CODE_SET;
+  withTerminator[10] = '=';
+  for (const char* codeSet : {repeated.c_str(), withTerminator.c_str(), "ABC", "", static_cast<const char*>(nullptr)}) {
+    sarn::Base64 codec(codeSet, '=');
+    EXPECT_TRUE(codec.fBadCodeSetM);
+    ref<vek::ByteBuffer> out = Bytes("old");
+    codec.Encode(&poolM, Bytes("foo"), out);
+    EXPECT_EQ(out->GetLength(), 0u);
+    out = Bytes("old");
+    EXPECT_FALSE(codec.Decode(&poolM, Bytes("Zm9v"), out));
+    EXPECT_EQ(Str(out), "old");
+  }
+  // A NUL terminator makes the string's own end count as the terminator.
+  EXPECT_FALSE(sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, 0).fBadCodeSetM);
+  EXPECT_TRUE(sarn::Base64("ABC", 0).fBadCodeSetM);
+}
+
+TEST_F(Base64Pool, LargeRoundTripAllocatesOnlyTheResult) {
+  std::string bytes(100001, '\0');
+  for (size_t i = 0; i < bytes.size(); ++i) bytes[i] = static_cast<char>(i * 7 + (i >> 8));
+  ref<vek::ByteBuffer> input = Bytes(bytes);
+  size_t before = poolM.GetUsedBytes();
+  ref<vek::ByteBuffer> text;
+  sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, '=').Encode(&poolM, input, text);
+  EXPECT_EQ(text->GetLength(), 133336u);
+  EXPECT_EQ(text->GetCapacity(), 133336u);
+  ref<vek::ByteBuffer> back;
+  ASSERT_TRUE(sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, '=').Decode(&poolM, text, back));
+  EXPECT_EQ(Str(back), bytes);
+  EXPECT_LE(back->GetCapacity(), bytes.size() + 2);
+  EXPECT_GT(poolM.GetUsedBytes(), before);
+  text.Reset();
+  back.Reset();
+  EXPECT_EQ(poolM.GetUsedBytes(), before);
+}
+
+TEST_F(Base64Pool, ByteLists) {
+  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text("\x01\xAB"))), "01 AB ");
+  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text(std::string("\0\xFF", 2)))), "00 FF ");
+  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text(""))), "");
+  EXPECT_EQ(Str(sarn::FormatBytesFromBytestring(&poolM, Bytes("\x10"))), "10 ");
+  EXPECT_EQ(Str(sarn::FormatBytesFromBytestring(&poolM, ref<vek::ByteBuffer>())), "");
+
+  struct Case {
+    std::string text;
+    std::string bytes;
+  };
+  const Case cases[] = {
+      {"01 AB ", "\x01\xAB"},
+      {"  1 ab", "\x01\xAB"},
+      {"1FF", "\xFF"},
+      {"zz", std::string(1, '\0')},
+      {"0x1f\t-1\r\n+2", "\x1F\xFF\x02"},
+      {"-80 -81", "\x80\x7F"},
+      {"FFFFFFFFFFFFFFFFFFFF -FFFFFFFFFFFFFFFFFFFF", std::string("\xFF\0", 2)},
+      {"-8000000000000000", std::string(1, '\0')},
+      {"1\x0B" "2\x0C\x0C" "3", "\x01\x02\x03"},
+      {std::string("4\0" "5", 3), "\x04\x05"},
+      {"", ""},
+      {" \t\r\n", ""},
+      {"0x", std::string(1, '\0')},
+      {"12x4", "\x12"},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(Str(sarn::ParseBytes(&poolM, Text(c.text))), c.bytes) << c.text;
+    EXPECT_EQ(Str(sarn::ParseBytesToBytestring(&poolM, Text(c.text))), c.bytes) << c.text;
+  }
+}
+
+}  // namespace
