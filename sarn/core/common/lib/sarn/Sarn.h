@@ -14,3 +14,5 @@
 #include "sarn/Json.h"
 #include "sarn/Base64.h"
 #include "sarn/Dict.h"
+#include "sarn/ScalarTypes.h"
+#include "sarn/StringUtil.h"
