@@ -25,8 +25,8 @@ struct LongIdPrefix {
 };
 // rs 1, ts 2, bs 3, tms.ep 5, tms.sh 6, tms.mv 7, tms.sp 8, vp 9, dlna 10, vod 16384; searched
 // in this order.
-SARN_EXPORT extern const LongIdPrefix longIdPrefixesG[];
 constexpr int nLongIdPrefixesG = 10;
+SARN_EXPORT extern const LongIdPrefix longIdPrefixesG[nLongIdPrefixesG];
 
 class SARN_EXPORT Dict : public VekCore {
  public:

@@ -16,3 +16,6 @@
 #include "sarn/Dict.h"
 #include "sarn/ScalarTypes.h"
 #include "sarn/StringUtil.h"
+#include "sarn/ObjectIdAndType.h"
+#include "sarn/SarnHashTable.h"
+#include "sarn/SarnUtil.h"
