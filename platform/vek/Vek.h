@@ -7,4 +7,5 @@
 #include "vek/VekHash.h"
 #include "vek/VekMempool.h"
 #include "vek/VekServices.h"
+#include "vek/VekSpinLock.h"
 #include "vek/VekString.h"

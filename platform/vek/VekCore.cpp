@@ -3,22 +3,48 @@
 #include "vek/VekServices.h"
 
 namespace {
-// The counted new hands the pool to the constructor through this slot: the constructor
-// takes it only when it builds the object at exactly the address the counted new returned,
-// so a VekCore made any other way (on the stack, say) gets the default pool.
-thread_local void* tPendingObjectG = nullptr;
-thread_local VekMempool* tPendingPoolG = nullptr;
+// The counted new hands the pool to the constructor through a short per-thread list of
+// (address, pool) pairs: a constructor takes its pool only when it builds the object at
+// exactly an address the counted new returned, so a VekCore made any other way (on the
+// stack, say) gets the default pool. A list rather than one slot because the arguments of
+// `new (pool) A(...)` are evaluated after A's memory is allocated and may themselves make
+// counted objects, whose constructors run before A's.
+struct PendingObject {
+  void* pObjectM;
+  VekMempool* pPoolM;
+};
+constexpr int kMaxPendingG = 16;
+thread_local PendingObject vPendingG[kMaxPendingG];
+thread_local int nPendingG = 0;
+
+void PushPending(void* p, VekMempool* pool) {
+  if (nPendingG == kMaxPendingG) {
+    // Deeper nesting than any real code: forget the oldest (its object falls back to the
+    // default pool for GetMempool, while its memory still returns to the right pool).
+    for (int i = 1; i < kMaxPendingG; ++i) vPendingG[i - 1] = vPendingG[i];
+    --nPendingG;
+  }
+  vPendingG[nPendingG++] = PendingObject{p, pool};
+}
+
+// Removes the entry for `p` and returns its pool, or null when `p` is not pending.
+VekMempool* TakePending(const void* p) {
+  for (int i = nPendingG - 1; i >= 0; --i) {
+    if (vPendingG[i].pObjectM != p) continue;
+    VekMempool* pool = vPendingG[i].pPoolM;
+    for (int j = i + 1; j < nPendingG; ++j) vPendingG[j - 1] = vPendingG[j];
+    --nPendingG;
+    return pool;
+  }
+  return nullptr;
+}
+
 const char kVekCoreClassKeyG = 0;
 }  // namespace
 
 VekCore::VekCore() : pMempoolM(nullptr), refCountM(0) {
-  if (tPendingObjectG == this) {
-    pMempoolM = tPendingPoolG;
-    tPendingObjectG = nullptr;
-    tPendingPoolG = nullptr;
-  } else {
-    pMempoolM = VekMempool::Default();
-  }
+  VekMempool* pool = nPendingG != 0 ? TakePending(this) : nullptr;
+  pMempoolM = pool != nullptr ? pool : VekMempool::Default();
 }
 
 VekCore::~VekCore() {}
@@ -27,8 +53,7 @@ void* VekCore::operator new(size_t size, VekMempool* pool) {
   if (pool == nullptr) pool = VekMempool::Default();
   void* p = pool->Malloc(size);
   if (p == nullptr) throw std::bad_alloc();
-  tPendingObjectG = p;
-  tPendingPoolG = pool;
+  PushPending(p, pool);
   return p;
 }
 
@@ -40,9 +65,9 @@ void VekCore::operator delete(void* p) {
 }
 
 void VekCore::operator delete(void* p, VekMempool* pool) {
-  tPendingObjectG = nullptr;
-  tPendingPoolG = nullptr;
-  if (p != nullptr) pool->Free(p);
+  if (p == nullptr) return;
+  TakePending(p);
+  (pool != nullptr ? pool : VekMempool::Default())->Free(p);
 }
 
 const void* VekCore::ZoCastHelper(const void* classKey) const {

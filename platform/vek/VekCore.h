@@ -51,6 +51,16 @@ class VekCore {
 
 static_assert(sizeof(void*) == 8, "64-bit platform expected");
 
+namespace vekinternal {
+// A derived class whose first member is 32 bits wide: it fits in VekCore's tail padding
+// (bytes 20..23) only when VekCore's data ends at byte 20, so the derived object stays 24 bytes.
+struct VekCoreLayoutProbe : VekCore {
+  uint32_t firstM;
+};
+}  // namespace vekinternal
+static_assert(sizeof(VekCore) == 24 && alignof(VekCore) == 8, "VekCore is vtable, pool, 32-bit count");
+static_assert(sizeof(vekinternal::VekCoreLayoutProbe) == 24, "a derived class's first 32-bit member sits at byte 20");
+
 // Counted pointer, shallow-const like std::shared_ptr.
 template <class T>
 class ref {

@@ -1,22 +1,32 @@
 // VekMempool: a named memory pool. Every allocation of the library names one.
 //
-// A pool keeps exact accounting of the bytes its callers asked for (GetUsedBytes) and the
-// highest that figure reached (GetUsedBytesHighWater). Small blocks (up to 512 bytes) are
-// recycled through per-size-class free lists kept in the pool, so allocating and freeing a
-// small block costs one uncontended lock and a list push or pop; larger blocks go to malloc.
-// The free lists hold at most kMaxCachedBytesPerClass bytes per class; beyond that a freed
-// block goes back to the C library, so a pool never keeps more than a bounded amount of
-// memory for reuse.
+// A pool keeps exact accounting of the bytes its callers asked for (GetUsedBytes) and of its
+// live blocks, and the highest figure the used bytes reached (GetUsedBytesHighWater). Small
+// blocks (up to 512 bytes) are recycled through per-size-class free lists kept in the pool;
+// larger blocks go straight to malloc. Each free list holds at most kMaxCachedBytesPerClass
+// bytes; beyond that a freed block goes back to the C library, so a pool never keeps more
+// than a bounded amount of memory for reuse. Builds with AddressSanitizer recycle nothing, so
+// that a use after free inside a pool is caught.
 //
 // Thread safety: every member may be called from any thread at once (an object may be made on
-// one thread and released on another). A pool must outlive every block allocated from it;
-// destroying a pool that still has live blocks reports them on standard error and, in builds
-// without NDEBUG, asserts.
+// one thread and released on another). The thread that constructed the pool takes a lock-free
+// path: its free lists and counters are its own. Other threads share a second set of free
+// lists under a spin lock and count with atomic additions; a block freed on another thread
+// reaches the owner's lists when the owner runs short. Used bytes and live blocks are exact
+// whenever the threads' calls are ordered (by a join, a lock, an atomic hand-off). The high
+// water is exact for allocations so ordered; two allocations racing on different threads may
+// each miss the other's bytes.
+//
+// A pool must outlive every block allocated from it; destroying a pool that still has live
+// blocks reports them on standard error and, in builds without NDEBUG, asserts. Destroying it
+// must not race with any other call on it.
 #pragma once
 
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+
+#include "vek/VekSpinLock.h"
 
 class VekMempool {
  public:
@@ -57,16 +67,32 @@ class VekMempool {
   struct FreeNode {
     FreeNode* pNextM;
   };
-  void Lock() const;
-  void Unlock() const;
+  bool IsOwnerThread() const;
+  void* MallocSmall(size_t nByte);
+  void FreeSmall(void* p, size_t nByte);
+  // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the count
+  // of the calling thread's side.
+  void Count(bool isOwner, size_t nByte, size_t nBlock);
+  void RaiseHighWater();
 
   char nameM[64];
-  mutable std::atomic_flag lockM = ATOMIC_FLAG_INIT;
-  size_t usedBytesM = 0;
-  size_t highWaterM = 0;
-  size_t liveBlocksM = 0;
-  FreeNode* vFreeM[kNumClasses] = {};
-  size_t vFreeCountM[kNumClasses] = {};
+  const void* pOwnerM;
+
+  // The owner thread's side: lists touched by it alone; counters written by it alone (a load
+  // and a store, no locked instruction) and read by anyone.
+  FreeNode* vOwnerFreeM[kNumClasses] = {};
+  uint32_t vOwnerFreeCountM[kNumClasses] = {};
+  std::atomic<size_t> ownerUsedM{0};
+  std::atomic<size_t> ownerLiveM{0};
+
+  // Everyone else's side, on its own cache lines so that it does not slow the owner down.
+  alignas(64) mutable VekSpinLock lockM;
+  std::atomic<size_t> sharedFreeBlocksM{0};  // blocks on the shared lists: lets the owner skip the lock
+  FreeNode* vSharedFreeM[kNumClasses] = {};
+  uint32_t vSharedFreeCountM[kNumClasses] = {};
+  alignas(64) std::atomic<size_t> sharedUsedM{0};
+  std::atomic<size_t> sharedLiveM{0};
+  std::atomic<size_t> highWaterM{0};
 };
 
 // Passed where the platform asks which subsystem uses a pool; recorded nowhere here.

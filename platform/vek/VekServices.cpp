@@ -12,12 +12,6 @@ void VekAssertFail(const char* condition, const char* file) {
   std::abort();
 }
 
-void VekSpinLock::Lock() {
-  while (flagM.test_and_set(std::memory_order_acquire)) {
-    __builtin_ia32_pause();
-  }
-}
-
 namespace {
 std::mutex& LoggerMutex() {
   static std::mutex* mutex = new std::mutex;

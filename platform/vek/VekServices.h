@@ -1,48 +1,17 @@
-// Small platform services: assertions, the spin lock, the logger, feature switches and time.
+// Small platform services: assertions, the spin lock (VekSpinLock.h), the logger, feature
+// switches and time. All of them may be used from any thread.
 #pragma once
 
 #include <atomic>
 #include <cstdint>
 
+#include "vek/VekSpinLock.h"
 #include "vek/VekString.h"
 
 // Reports a broken internal invariant ("condition" failed in "file") and aborts. Ordinary
 // input never reaches it.
 [[noreturn]] void VekAssertFail(const char* condition, const char* file);
 #define VekAssert(condition) ((condition) ? (void)0 : VekAssertFail(#condition, __FILE__))
-
-// Identifies the lock that owns a structure in debug builds of the platform; recorded nowhere here.
-typedef uint32_t VekLockId;
-
-// A busy-waiting lock for very short critical sections. Not recursive.
-class VekSpinLock {
- public:
-  // `name` and `rank` describe the lock to the platform's lock checker, which this stand-in lacks.
-  explicit VekSpinLock(const char* name = nullptr, int rank = 0) : nameM(name), rankM(rank) {}
-  VekSpinLock(const VekSpinLock&) = delete;
-  VekSpinLock& operator=(const VekSpinLock&) = delete;
-  void Lock();
-  void Unlock() { flagM.clear(std::memory_order_release); }
-  bool TryLock() { return !flagM.test_and_set(std::memory_order_acquire); }
-  const char* GetName() const { return nameM; }
-  int GetRank() const { return rankM; }
-
- private:
-  std::atomic_flag flagM = ATOMIC_FLAG_INIT;
-  const char* nameM;
-  int rankM;
-};
-
-class VekSpinLockGuard {
- public:
-  explicit VekSpinLockGuard(VekSpinLock& lock) : lockM(lock) { lockM.Lock(); }
-  ~VekSpinLockGuard() { lockM.Unlock(); }
-  VekSpinLockGuard(const VekSpinLockGuard&) = delete;
-  VekSpinLockGuard& operator=(const VekSpinLockGuard&) = delete;
-
- private:
-  VekSpinLock& lockM;
-};
 
 // The platform logger. Each call formats one line; with no sink set the line goes to
 // standard error as "<tag>: <line>". A sink receives every line instead (thread-safe: the

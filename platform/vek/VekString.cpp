@@ -29,9 +29,11 @@ VekString::VekString(const char* text) : pRepM(nullptr) {
 }
 
 VekString& VekString::operator=(const VekString& other) {
-  if (other.pRepM != nullptr) other.pRepM->refCountM.fetch_add(1, std::memory_order_relaxed);
+  // Take the representation before releasing ours: `other` may be this very string.
+  VekStringRepN* rep = other.pRepM;
+  if (rep != nullptr) rep->refCountM.fetch_add(1, std::memory_order_relaxed);
   Release();
-  pRepM = other.pRepM;
+  pRepM = rep;
   return *this;
 }
 
@@ -88,27 +90,31 @@ bool VekString::FEqual(const char* text) const {
   return n == NByte() && std::memcmp(Utf8(), text, n) == 0;
 }
 
-long VekString::FindString(const VekString& needle, long startPos) const {
-  long size = static_cast<long>(NByte());
-  long nNeedle = static_cast<long>(needle.NByte());
+namespace {
+// Byte position of the first `needle` in `hay` at or after `startPos`, or -1. memchr finds
+// candidates for the first byte so that long texts without it are skipped quickly.
+long FindBytes(const char* hay, long size, const char* needle, long nNeedle, long startPos) {
   if (startPos < 0) startPos = 0;
   if (startPos > size || nNeedle > size - startPos) return -1;
   if (nNeedle == 0) return startPos;
-  const char* hay = Utf8();
-  const char* first = needle.Utf8();
   for (long i = startPos; i + nNeedle <= size;) {
-    const void* hit = std::memchr(hay + i, first[0], static_cast<size_t>(size - nNeedle + 1 - i));
+    const void* hit = std::memchr(hay + i, needle[0], static_cast<size_t>(size - nNeedle + 1 - i));
     if (hit == nullptr) return -1;
     i = static_cast<const char*>(hit) - hay;
-    if (std::memcmp(hay + i, first, static_cast<size_t>(nNeedle)) == 0) return i;
+    if (std::memcmp(hay + i, needle, static_cast<size_t>(nNeedle)) == 0) return i;
     ++i;
   }
   return -1;
 }
+}  // namespace
+
+long VekString::FindString(const VekString& needle, long startPos) const {
+  return FindBytes(Utf8(), static_cast<long>(NByte()), needle.Utf8(), static_cast<long>(needle.NByte()), startPos);
+}
 
 long VekString::FindString(const char* needle, long startPos) const {
-  VekString temporary = FromUtf8Bytes(GetMempool(), needle != nullptr ? std::strlen(needle) : 0, needle);
-  return FindString(temporary, startPos);
+  if (needle == nullptr) needle = "";
+  return FindBytes(Utf8(), static_cast<long>(NByte()), needle, static_cast<long>(std::strlen(needle)), startPos);
 }
 
 VekString VekString::Slice(long startPos, long endPos) const {
@@ -125,9 +131,9 @@ VekString VekString::Middle(long startPos, long endPos) const { return Slice(sta
 
 long VekString::AdvancePos(long pos, long count) const {
   long size = static_cast<long>(NByte());
-  if (pos < 0) pos = 0;
+  pos = std::clamp(pos, 0L, size);
   if (count < 0) count = 0;
-  return count > size - std::min(pos, size) ? size : pos + count;
+  return count > size - pos ? size : pos + count;
 }
 
 long VekString::GetCharacterPos(long index) const { return std::clamp(index, 0L, static_cast<long>(NByte())); }

@@ -15,8 +15,7 @@
 #include <cstring>
 
 #include "vek/VekMempool.h"
-
-typedef uint32_t VekLockId;
+#include "vek/VekSpinLock.h"
 
 // The shared representation: count, length, pool, then the bytes and a NUL.
 struct VekStringRepN {

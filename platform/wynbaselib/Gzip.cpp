@@ -36,6 +36,7 @@ struct GzipBytesink::State {
   Bytesink* pNextM;
   bool isOpenM = false;     // deflateInit done
   bool isPendingM = false;  // bytes written since the last member ended
+  bool wasMemberWrittenM = false;
   bool isErrorM = false;
   int levelM;
   VekMempool* pMempoolM;
@@ -91,7 +92,9 @@ GzipBytesink::~GzipBytesink() {
 
 bool GzipBytesink::Write(const char* data, size_t size) {
   State& s = *pStateM;
-  if (s.isErrorM || !s.Open()) return false;
+  if (s.isErrorM) return false;
+  if (size == 0) return true;
+  if (!s.Open()) return false;
   s.isPendingM = true;
   while (size > 0) {
     uInt piece = size > 0x40000000 ? 0x40000000 : static_cast<uInt>(size);
@@ -107,13 +110,16 @@ bool GzipBytesink::Write(const char* data, size_t size) {
 bool GzipBytesink::Flush() {
   State& s = *pStateM;
   if (s.isErrorM) return false;
-  if (s.isPendingM || !s.isOpenM) {
+  // A sink flushed before anything was written still holds one (empty) member, so that its
+  // output is a valid gzip stream; later flushes without new bytes add nothing.
+  if (s.isPendingM || !s.wasMemberWrittenM) {
     if (!s.Open()) return false;
     s.streamM.next_in = nullptr;
     s.streamM.avail_in = 0;
     if (!s.Pump(Z_FINISH)) return false;
     s.Close();
     s.isPendingM = false;
+    s.wasMemberWrittenM = true;
   }
   if (!s.pNextM->Flush()) {
     s.isErrorM = true;
@@ -195,14 +201,17 @@ size_t GunzipBytesource::Read(void* buffer, size_t size) {
       s.isMemberDoneM = true;
     } else if (status == Z_BUF_ERROR && s.streamM.avail_in == 0) {
       continue;  // needs more input; the loop refills
+    } else if (status == Z_MEM_ERROR) {
+      s.pErrorM = "out of memory in gzip decoder";
+      break;
     } else if (status != Z_OK) {
       s.pErrorM = "corrupt gzip stream";
       break;
     }
   }
-  size_t produced = size - s.streamM.avail_out;
-  if (s.pErrorM != nullptr) return 0;  // nothing of a failed step is delivered
-  return produced;
+  // What was decoded before a fault is delivered (the next Read returns 0 and FError says
+  // why), so the output never depends on how the caller sizes its reads.
+  return size - s.streamM.avail_out;
 }
 
 Bytesource* GunzipBytesource::Duplicate() {

@@ -6,8 +6,12 @@
 // bytes are pending.
 //
 // GunzipBytesource decompresses `source`. A corrupt stream, or one that ends before its
-// trailer, ends the output with nothing invented: Read returns 0 and FError() tells it from a
-// clean end. zlib's memory comes from `pool` when one is given, else from the C library.
+// trailer (an empty source included), ends the output: the bytes decoded before the fault are
+// delivered, then Read returns 0 and FError() tells it from a clean end, GetErrorText() saying
+// "corrupt gzip stream" or "truncated gzip stream". The source is read 16 KiB at a time.
+// zlib's memory comes from `pool` when one is given, else from the C library.
+//
+// Neither class is locked: each is used by one thread at a time.
 #pragma once
 
 #include <cstddef>

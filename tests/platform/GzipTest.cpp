@@ -1,0 +1,216 @@
+// Gzip over sinks and sources: round trips in small reads, members, corrupt and truncated
+// input told apart from a clean end, duplicates, and failing sinks.
+#include <memory>
+#include <string>
+
+#include "testutil/TestUtil.h"
+#include "wynbaselib/Gzip.h"
+
+namespace {
+
+using wynbaselib::Bytesink;
+using wynbaselib::Bytesource;
+using wynbaselib::GunzipBytesource;
+using wynbaselib::GzipBytesink;
+using wynbaselib::InMemoryBytestream;
+
+// Text that compresses, with enough variety to need several deflate blocks.
+std::string SampleText(size_t n) {
+  std::string text;
+  uint32_t x = 1;
+  while (text.size() < n) {
+    x = x * 1664525u + 1013904223u;
+    text += "line " + std::to_string(x % 1000) + (x & 0x10000 ? " alpha\n" : " beta, gamma\n");
+  }
+  text.resize(n);
+  return text;
+}
+
+std::string Gzip(const std::string& text, size_t writeSize = 1000) {
+  InMemoryBytestream out;
+  GzipBytesink sink(&out);
+  for (size_t at = 0; at < text.size(); at += writeSize) {
+    EXPECT_TRUE(sink.Write(text.data() + at, std::min(writeSize, text.size() - at)));
+  }
+  EXPECT_TRUE(sink.Flush());
+  return out.GetContent();
+}
+
+std::string ReadAll(Bytesource& source, size_t block) {
+  std::string out;
+  std::string buffer(block, '\0');
+  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
+  return out;
+}
+
+struct Gunzipped {
+  std::string textM;
+  bool isErrorM;
+  std::string errorM;
+};
+
+Gunzipped Gunzip(const std::string& compressed, size_t block, VekMempool* pool = nullptr) {
+  InMemoryBytestream in(compressed);
+  GunzipBytesource source(&in, pool);
+  Gunzipped result;
+  result.textM = ReadAll(source, block);
+  result.isErrorM = source.FError();
+  result.errorM = source.GetErrorText();
+  char c;
+  EXPECT_EQ(source.Read(&c, 1), 0u) << "stays at its end";
+  return result;
+}
+
+using GzipTest = sarntest::PoolTest;
+
+TEST_F(GzipTest, OneMegabyteRoundTripsThrough512ByteReads) {
+  const std::string text = SampleText(1 << 20);
+  InMemoryBytestream compressed;
+  {
+    GzipBytesink sink(&compressed, &poolM);
+    // Writes of uneven sizes, so that deflate's input never lines up with its blocks.
+    for (size_t at = 0, step = 1; at < text.size(); at += step, step = step * 3 % 7919 + 1) {
+      ASSERT_TRUE(sink.Write(text.data() + at, std::min(step, text.size() - at)));
+    }
+    EXPECT_GT(poolM.GetUsedBytes(), 0u) << "zlib's state lives in the pool";
+    ASSERT_TRUE(sink.Flush());
+    EXPECT_FALSE(sink.FError());
+  }
+  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+  const std::string& bytes = compressed.GetContent();
+  ASSERT_GT(bytes.size(), 18u);
+  EXPECT_LT(bytes.size(), text.size() / 4);
+  EXPECT_EQ(bytes.substr(0, 3), "\x1f\x8b\x08") << "gzip magic and deflate method";
+
+  Gunzipped back = Gunzip(bytes, 512, &poolM);
+  EXPECT_FALSE(back.isErrorM) << back.errorM;
+  EXPECT_EQ(back.errorM, "");
+  EXPECT_TRUE(back.textM == text) << "the 1 MB text differs after the round trip";
+  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+}
+
+TEST_F(GzipTest, FlushEndsMembersThatReadBackAsOneStream) {
+  InMemoryBytestream out;
+  {
+    GzipBytesink sink(&out);
+    ASSERT_TRUE(sink.Flush());  // nothing written yet: one empty member, a valid stream
+    EXPECT_EQ(out.GetContent().size(), 20u);
+    ASSERT_TRUE(sink.Flush());
+    EXPECT_EQ(out.GetContent().size(), 20u) << "a second flush adds nothing";
+    ASSERT_TRUE(sink.Write("first ", 6));
+    ASSERT_TRUE(sink.Write("", 0));
+    ASSERT_TRUE(sink.Flush());
+    ASSERT_TRUE(sink.Write("second", 6));
+  }  // the destructor ends the pending member
+  Gunzipped back = Gunzip(out.GetContent(), 4);
+  EXPECT_EQ(back.textM, "first second");
+  EXPECT_FALSE(back.isErrorM);
+
+  InMemoryBytestream untouched;
+  { GzipBytesink sink(&untouched); }
+  EXPECT_EQ(untouched.GetContent(), "") << "a sink never written nor flushed writes nothing";
+}
+
+TEST_F(GzipTest, TruncationAtEveryPositionIsAnErrorWithAPrefixOfTheText) {
+  const std::string text = SampleText(3000);
+  const std::string bytes = Gzip(text) + Gzip("tail");
+  const size_t firstMember = Gzip(text).size();
+  for (size_t cut = 0; cut <= bytes.size(); ++cut) {
+    Gunzipped part = Gunzip(bytes.substr(0, cut), cut % 2 == 0 ? 7 : 4096);
+    bool isClean = cut == firstMember || cut == bytes.size();
+    EXPECT_EQ(part.isErrorM, !isClean) << "cut at " << cut;
+    EXPECT_EQ(part.errorM, isClean ? "" : "truncated gzip stream") << "cut at " << cut;
+    EXPECT_EQ(part.textM, (text + "tail").substr(0, part.textM.size())) << "cut at " << cut;
+    if (cut == firstMember) {
+      EXPECT_EQ(part.textM, text);
+    }
+  }
+}
+
+TEST_F(GzipTest, CorruptionIsToldFromTruncation) {
+  const std::string text = SampleText(5000);
+  const std::string good = Gzip(text);
+  auto corrupt = [&](size_t at, char value) {
+    std::string bad = good;
+    bad[at] = value;
+    return Gunzip(bad, 512);
+  };
+  Gunzipped badMagic = corrupt(0, 0x1e);
+  EXPECT_TRUE(badMagic.isErrorM);
+  EXPECT_EQ(badMagic.errorM, "corrupt gzip stream");
+  EXPECT_EQ(badMagic.textM, "") << "nothing invented";
+
+  Gunzipped badCrc = corrupt(good.size() - 8, static_cast<char>(good[good.size() - 8] ^ 1));
+  EXPECT_EQ(badCrc.errorM, "corrupt gzip stream");
+  EXPECT_EQ(badCrc.textM, text) << "the data before the trailer was decoded";
+
+  Gunzipped badLength = corrupt(good.size() - 1, static_cast<char>(good.back() ^ 0x40));
+  EXPECT_EQ(badLength.errorM, "corrupt gzip stream");
+
+  Gunzipped garbageAfter = Gunzip(good + "junk", 512);
+  EXPECT_EQ(garbageAfter.errorM, "corrupt gzip stream");
+  EXPECT_EQ(garbageAfter.textM, text);
+
+  Gunzipped empty = Gunzip("", 512);
+  EXPECT_EQ(empty.errorM, "truncated gzip stream") << "no bytes at all is no gzip stream";
+
+  // The same damage gives the same text and error whatever the read size.
+  std::string bad = good;
+  bad[good.size() / 2] ^= 0x55;
+  Gunzipped whole = Gunzip(bad, 1 << 20);
+  EXPECT_TRUE(whole.isErrorM);
+  for (size_t block : {1u, 3u, 512u}) {
+    Gunzipped chunked = Gunzip(bad, block);
+    EXPECT_EQ(chunked.textM, whole.textM) << block;
+    EXPECT_EQ(chunked.errorM, whole.errorM) << block;
+  }
+}
+
+TEST_F(GzipTest, DuplicateReadsTheRestWithoutDisturbingTheOriginal) {
+  const std::string text = SampleText(100000);
+  InMemoryBytestream in(Gzip(text));
+  GunzipBytesource original(&in, &poolM);
+  std::string head(30000, '\0');
+  size_t got = 0;
+  while (got < head.size()) got += original.Read(&head[got], head.size() - got);
+  std::unique_ptr<Bytesource> duplicate(original.Duplicate());
+  ASSERT_NE(duplicate, nullptr);
+  EXPECT_EQ(ReadAll(*duplicate, 333), text.substr(30000));
+  EXPECT_FALSE(duplicate->FError());
+  EXPECT_EQ(ReadAll(original, 4096), text.substr(30000)) << "the original goes on from where it was";
+  duplicate.reset();
+
+  wynbaselib::FdBytesource fd(-1);
+  GunzipBytesource overFd(&fd);
+  EXPECT_EQ(overFd.Duplicate(), nullptr) << "not duplicable when the source is not";
+}
+
+TEST_F(GzipTest, OwnedSourceIsDeletedWithTheReader) {
+  // The sanitizer build reports a leak if the owned source outlives the reader.
+  auto* in = new InMemoryBytestream(Gzip("owned"));
+  GunzipBytesource source(in, nullptr, true);
+  EXPECT_EQ(ReadAll(source, 2), "owned");
+}
+
+class FailingSink : public Bytesink {
+ public:
+  bool Write(const char*, size_t) override { return false; }
+  bool Flush() override { return false; }
+};
+
+TEST_F(GzipTest, SinkFailureIsStickyAndReported) {
+  FailingSink failing;
+  GzipBytesink sink(&failing, &poolM);
+  const std::string text = SampleText(200000);  // more than deflate buffers: it must write
+  EXPECT_FALSE(sink.Write(text.data(), text.size()));
+  EXPECT_TRUE(sink.FError());
+  EXPECT_FALSE(sink.Write("x", 1));
+  EXPECT_FALSE(sink.Flush());
+
+  InMemoryBytestream out;
+  GzipBytesink badLevel(&out, nullptr, 42);
+  EXPECT_FALSE(badLevel.Write("x", 1));
+  EXPECT_TRUE(badLevel.FError());
+}
+
+}  // namespace

@@ -1,0 +1,82 @@
+// String-keyed hash tables: keys compared by all their bytes, values replaced and released,
+// growth keeping every entry reachable.
+#include <map>
+#include <string>
+
+#include "testutil/TestUtil.h"
+
+namespace {
+
+class Value : public VekCore {
+ public:
+  explicit Value(int n) : nM(n) {}
+  int nM;
+};
+
+using HashTest = sarntest::PoolTest;
+
+VekString Key(VekMempool* pool, const std::string& text) { return VekString::FromUtf8Bytes(pool, text.size(), text.data()); }
+
+TEST_F(HashTest, CoreTableHoldsAndReleasesReferences) {
+  VekHashStringToCore<Value> table(&poolM);
+  ref<Value> one = new (&poolM) Value(1);
+  ref<Value> two = new (&poolM) Value(2);
+  EXPECT_EQ(table.Find(Key(&poolM, "a")), nullptr) << "an empty table finds nothing";
+  ASSERT_TRUE(table.Put(Key(&poolM, "a"), one));
+  ASSERT_TRUE(table.Put(Key(&poolM, std::string("a\0b", 3)), two));
+  EXPECT_EQ(table.Count(), 2u);
+  EXPECT_EQ(table.Find(Key(&poolM, "a")), one.Get());
+  EXPECT_EQ(table.Find("a\0b", 3), two.Get()) << "keys differ after an embedded NUL";
+  EXPECT_EQ(table.Find("a\0c", 3), nullptr);
+  EXPECT_EQ(one->GetRefCount(), 2u);
+
+  ASSERT_TRUE(table.Put(Key(&poolM, "a"), two));  // replaces and releases the old value
+  EXPECT_EQ(table.Count(), 2u);
+  EXPECT_EQ(one->GetRefCount(), 1u);
+  EXPECT_EQ(two->GetRefCount(), 3u);
+  EXPECT_TRUE(table.Remove(Key(&poolM, "a")));
+  EXPECT_FALSE(table.Remove(Key(&poolM, "a")));
+  EXPECT_EQ(two->GetRefCount(), 2u);
+  table.Clear();
+  EXPECT_EQ(table.Count(), 0u);
+  EXPECT_EQ(two->GetRefCount(), 1u);
+  EXPECT_TRUE(table.Put(Key(&poolM, ""), one)) << "usable after Clear; the empty key is a key";
+  EXPECT_EQ(table.Find(VekString()), one.Get());
+}
+
+TEST_F(HashTest, GrowthKeepsEveryEntryAndForEachVisitsEachOnce) {
+  VekHashStringToStringNew table(&poolM);
+  constexpr int kEntries = 5000;
+  for (int i = 0; i < kEntries; ++i) {
+    std::string k = "key" + std::to_string(i);
+    ASSERT_TRUE(table.Put(Key(&poolM, k), Key(&poolM, "value" + std::to_string(i))));
+  }
+  EXPECT_EQ(table.Count(), static_cast<size_t>(kEntries));
+  for (int i = 0; i < kEntries; i += 7) {
+    std::string k = "key" + std::to_string(i);
+    const VekString* v = table.Find(k.data(), k.size());
+    ASSERT_NE(v, nullptr) << k;
+    EXPECT_EQ(*v, ("value" + std::to_string(i)).c_str());
+  }
+  std::map<std::string, std::string> seen;
+  table.ForEach([&](const VekString& k, const VekString& v) {
+    EXPECT_TRUE(seen.emplace(k.Utf8(), v.Utf8()).second) << "visited twice: " << k.Utf8();
+  });
+  EXPECT_EQ(seen.size(), static_cast<size_t>(kEntries));
+  EXPECT_EQ(seen["key4999"], "value4999");
+}
+
+TEST_F(HashTest, StringTableInternsOneStoredInstance) {
+  VekHashStringToStringNew table(&poolM);
+  VekString stored = Key(&poolM, "text");
+  ASSERT_TRUE(table.Put(stored, stored));
+  // A lookup with an equal but separate text gives the stored instance back.
+  const VekString* found = table.Find(Key(&poolM, "text"));
+  ASSERT_NE(found, nullptr);
+  EXPECT_EQ(found->GetRep(), stored.GetRep());
+  ASSERT_TRUE(table.Put(Key(&poolM, "text"), Key(&poolM, "other")));
+  EXPECT_EQ(table.Count(), 1u);
+  EXPECT_EQ(*table.Find(stored), "other");
+}
+
+}  // namespace

@@ -1,0 +1,108 @@
+// Byte sources and sinks: in-memory streams sharing one content, duplicates that leave the
+// original alone, counting, file descriptors, and a caller's own minimal source.
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <memory>
+#include <string>
+
+#include "testutil/TestUtil.h"
+#include "wynbaselib/Bytestream.h"
+
+namespace {
+
+using wynbaselib::Bytesource;
+using wynbaselib::InMemoryBytestream;
+
+std::string ReadAll(Bytesource& source, size_t block) {
+  std::string out;
+  std::string buffer(block, '\0');
+  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
+  return out;
+}
+
+TEST(StreamTest, InMemoryCopiesShareContentAndReadFromTheirOwnPosition) {
+  InMemoryBytestream stream("hello");
+  char buffer[16];
+  ASSERT_EQ(stream.Read(buffer, 2), 2u);
+  InMemoryBytestream copy = stream;  // shares the content, starts at position 2
+  EXPECT_TRUE(copy.Write(" world", 6)) << "appends to the shared content";
+  EXPECT_EQ(stream.GetContent(), "hello world");
+  EXPECT_EQ(ReadAll(copy, 3), "llo world");
+  EXPECT_EQ(stream.GetPosition(), 2u) << "reading the copy leaves the original where it was";
+
+  std::unique_ptr<Bytesource> duplicate(stream.Duplicate());
+  EXPECT_EQ(ReadAll(*duplicate, 1), "llo world");
+  EXPECT_EQ(ReadAll(stream, 4), "llo world");
+  EXPECT_EQ(stream.Read(buffer, sizeof buffer), 0u) << "0 again after the end";
+  EXPECT_FALSE(stream.FError());
+  EXPECT_STREQ(stream.GetErrorText(), "");
+
+  stream.Seek(6);
+  EXPECT_EQ(ReadAll(stream, 16), "world");
+  stream.Seek(1000);
+  EXPECT_EQ(stream.GetPosition(), 11u) << "seek clamps to the content";
+  EXPECT_EQ(stream.Read(buffer, 0), 0u);
+  InMemoryBytestream bytes("a\0b", 3);
+  EXPECT_EQ(ReadAll(bytes, 8), std::string("a\0b", 3));
+}
+
+TEST(StreamTest, CountingSinkCountsAndPassesOn) {
+  InMemoryBytestream target;
+  wynbaselib::ByteCountingBytesink counter(&target);
+  EXPECT_TRUE(counter.Write("abc", 3));
+  EXPECT_TRUE(counter.Write("", 0));
+  EXPECT_TRUE(counter.Write("de", 2));
+  EXPECT_TRUE(counter.Flush());
+  EXPECT_EQ(counter.GetCount(), 5u);
+  EXPECT_EQ(target.GetContent(), "abcde");
+  wynbaselib::ByteCountingBytesink alone;
+  EXPECT_TRUE(alone.Write("xyz", 3));
+  EXPECT_EQ(alone.GetCount(), 3u);
+}
+
+TEST(StreamTest, FileDescriptorSourceAndSink) {
+  int fds[2];
+  ASSERT_EQ(pipe(fds), 0);
+  wynbaselib::FdBytesink sink(fds[1]);
+  EXPECT_TRUE(sink.Write("through a pipe", 14));
+  EXPECT_TRUE(sink.Flush());
+  close(fds[1]);
+  wynbaselib::FdBytesource source(fds[0]);
+  EXPECT_EQ(source.Duplicate(), nullptr) << "a descriptor has one shared position";
+  EXPECT_EQ(ReadAll(source, 5), "through a pipe");
+  EXPECT_FALSE(source.FError()) << "end of file is a clean end";
+  close(fds[0]);
+
+  wynbaselib::FdBytesource closed(fds[0]);
+  char c;
+  EXPECT_EQ(closed.Read(&c, 1), 0u);
+  EXPECT_TRUE(closed.FError());
+  EXPECT_STREQ(closed.GetErrorText(), "read error");
+  wynbaselib::FdBytesink broken(-1);
+  EXPECT_FALSE(broken.Write("x", 1));
+}
+
+// A caller's source needs only the two pure virtual functions.
+class CountdownSource : public Bytesource {
+ public:
+  explicit CountdownSource(int n) : nM(n) {}
+  size_t Read(void* buffer, size_t size) override {
+    if (nM == 0 || size == 0) return 0;
+    static_cast<char*>(buffer)[0] = static_cast<char>('0' + --nM);
+    return 1;
+  }
+  Bytesource* Duplicate() override { return new CountdownSource(nM); }
+
+ private:
+  int nM;
+};
+
+TEST(StreamTest, MinimalUserSourceGetsDefaultErrorQueries) {
+  CountdownSource source(3);
+  EXPECT_EQ(ReadAll(source, 4), "210");
+  EXPECT_FALSE(source.FError());
+  EXPECT_STREQ(source.GetErrorText(), "");
+}
+
+}  // namespace
