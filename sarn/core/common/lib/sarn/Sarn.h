@@ -19,3 +19,4 @@
 #include "sarn/ObjectIdAndType.h"
 #include "sarn/SarnHashTable.h"
 #include "sarn/SarnUtil.h"
+#include "sarn/RpcV2Parser.h"
