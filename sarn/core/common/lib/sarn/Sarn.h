@@ -6,6 +6,7 @@
 #include "wynbaselib/Gzip.h"
 
 #include "sarn/Export.h"
+#include "sarn/GeneratedSupport.h"
 #include "sarn/SarnObject.h"
 #include "sarn/Schema.h"
 #include "sarn/StructInfoMap.h"
@@ -20,3 +21,6 @@
 #include "sarn/SarnHashTable.h"
 #include "sarn/SarnUtil.h"
 #include "sarn/RpcV2Parser.h"
+
+// Every generated schema class (namespace sarnschema), from the build tree.
+#include "schema/sarn-schema.h"
