@@ -4,6 +4,9 @@
 //   schemagen SCHEMA --dump                                 print the tables as text
 //   schemagen SCHEMA --check                                only check the schema
 //
+// --out also checks that the schema carries the types the runtime names, with their ids and
+// fields; --dump and --check accept any well-formed schema (test fixtures, drafts).
+//
 // A bad schema is refused with one "file:line: message" per problem on standard error and exit
 // status 1; nothing is written then, so a build never compiles half-generated code.
 #include <algorithm>
@@ -61,6 +64,7 @@ int main(int argc, char** argv) {
   std::vector<schemagen::Diagnostic> errors;
   schemagen::ParseSchema(text.str(), schema, errors);
   if (errors.empty()) schemagen::ResolveSchema(schema, errors);
+  if (errors.empty() && mode == "--out") schemagen::CheckRuntimeTypes(schema, errors);
   if (!errors.empty()) {
     std::stable_sort(errors.begin(), errors.end(),
                      [](const schemagen::Diagnostic& a, const schemagen::Diagnostic& b) { return a.line < b.line; });

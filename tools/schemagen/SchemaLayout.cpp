@@ -114,7 +114,7 @@ class Resolver {
         Error(type.line, "type name '" + type.name + "' is not an identifier starting with a lower-case letter");
       } else {
         type.className = Capitalized(type.name);
-        bool allCapitals = std::none_of(type.className.begin(), type.className.end(),
+        bool allCapitals = type.className.size() >= 2 && std::none_of(type.className.begin(), type.className.end(),
                                         [](char c) { return std::islower(static_cast<unsigned char>(c)); });
         if (allCapitals) Error(type.line, "type name '" + type.name + "' would give the all-capitals class name '" + type.className + "'");
         if (IsReservedClassName(type.className)) {
@@ -277,7 +277,8 @@ class Resolver {
       CheckOverlaps(field);
     }
     std::stable_sort(type.fields.begin(), type.fields.end(), [](const Field& a, const Field& b) { return a.number < b.number; });
-    Layout(type);
+    // Duplicate names were reported already; their members would only be reported again.
+    Layout(type, names.size() == type.fields.size());
   }
 
   // Two records of one field may not cover the same version: the history rule would silently
@@ -305,7 +306,7 @@ class Resolver {
     Record* record;
   };
 
-  void Layout(Type& type) {
+  void Layout(Type& type, bool checkMembers) {
     std::vector<Slot> slots;
     for (Field& field : type.fields) {
       for (size_t i = 0; i < field.older.size(); ++i) {
@@ -328,7 +329,7 @@ class Resolver {
       if (r.arity != AR_OPTIONAL || !kDataTypes[r.dataType].hasFlag) continue;
       r.flagMemberName = "fHas" + Capitalized(r.memberName);
       r.flagOffset = offset++;
-      if (!members.insert(r.flagMemberName).second) {
+      if (!members.insert(r.flagMemberName).second && checkMembers) {
         Error(r.line, "member '" + r.flagMemberName + "' of type '" + type.name + "' would be declared twice");
       }
     }
@@ -343,7 +344,7 @@ class Resolver {
       offset = AlignUp(offset, align);
       r.valueOffset = offset;
       offset += size;
-      if (!members.insert(r.memberName).second) {
+      if (!members.insert(r.memberName).second && checkMembers) {
         Error(r.line, "member '" + r.memberName + "' of type '" + type.name + "' would be declared twice");
       }
     }

@@ -123,5 +123,8 @@ struct Diagnostic {
 void ParseSchema(const std::string& text, Schema& schema, std::vector<Diagnostic>& errors);
 // Checks the parsed schema and derives layouts and tables; appends problems to `errors`.
 void ResolveSchema(Schema& schema, std::vector<Diagnostic>& errors);
+// Checks that a resolved schema carries the types the runtime names (the error object and the
+// envelopes) with their ids and fields; needed only when code is generated for the library.
+void CheckRuntimeTypes(const Schema& schema, std::vector<Diagnostic>& errors);
 
 }  // namespace schemagen
