@@ -24,3 +24,8 @@
 
 // Every generated schema class (namespace sarnschema), from the build tree.
 #include "schema/sarn-schema.h"
+#include "sarn/Limits.h"
+#include "sarn/DictValue.h"
+#include "sarn/Dictionary.h"
+#include "sarn/JsonParser.h"
+#include "sarn/LazyDict.h"
