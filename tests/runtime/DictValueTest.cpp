@@ -1,0 +1,284 @@
+// The value tree: exact JSON bytes, repeated names, name order, equality, typed readers and
+// release of deep trees.
+#include <algorithm>
+#include <random>
+
+#include "runtime/DictTestSupport.h"
+
+namespace {
+
+using namespace dicttest;
+using DictValueTest = sarntest::PoolTest;
+
+ref<StringValue> Bare(VekMempool* pool, const char* text) {
+  ref<StringValue> value = StringValue::Make(text, pool);
+  value->SetNeedQuotes(false);
+  return value;
+}
+
+// Writes through a byte sink and checks that it gives the same bytes as the buffer form.
+std::string ViaSink(const ref<DictValue>& value, bool pretty) {
+  wynbaselib::InMemoryBytestream sink;
+  value->ToJson(sink, JsonFormat(pretty));
+  return sink.GetContent();
+}
+
+TEST_F(DictValueTest, WritesCompactAndPrettyBytes) {
+  ref<Dictionary> dictionary = new (&poolM) Dictionary();
+  ref<ArrayValue> array = new (&poolM) ArrayValue();
+  array->Add(Bare(&poolM, "1"));
+  array->Add(Bare(&poolM, "2"));
+  dictionary->Add(VekString("b"), array);
+  dictionary->Add(VekString("a"), Bare(&poolM, "1"));
+  EXPECT_EQ(Compact(dictionary), R"({"a": 1, "b": [1, 2]})");
+  EXPECT_EQ(Pretty(dictionary), "{\n    \"a\": 1, \n    \"b\": [\n        1, \n        2\n    ]\n}");
+  EXPECT_EQ(ViaSink(dictionary, false), Compact(dictionary));
+  EXPECT_EQ(ViaSink(dictionary, true), Pretty(dictionary));
+  EXPECT_EQ(Str(dictionary->ToBytestring(true)), Pretty(dictionary));
+
+  ref<Dictionary> empty = new (&poolM) Dictionary();
+  ref<ArrayValue> emptyArray = new (&poolM) ArrayValue();
+  EXPECT_EQ(Compact(empty), "{}");
+  EXPECT_EQ(Pretty(empty), "{\n}");
+  EXPECT_EQ(Compact(emptyArray), "[]");
+  EXPECT_EQ(Pretty(emptyArray), "[\n\n]");
+  ref<Dictionary> holder = new (&poolM) Dictionary();
+  holder->Add(VekString("e"), emptyArray);
+  holder->Add(VekString("f"), empty);
+  holder->Add(VekString("n"), ref<NullValue>(new (&poolM) NullValue()));
+  EXPECT_EQ(Compact(holder), R"({"e": [], "f": {}, "n": null})");
+  EXPECT_EQ(Pretty(holder), "{\n    \"e\": [\n\n    ], \n    \"f\": {\n    }, \n    \"n\": null\n}");
+  EXPECT_EQ(ViaSink(holder, true), Pretty(holder));
+}
+
+TEST_F(DictValueTest, ScalarsPickQuotesByMakerAndText) {
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  d->Add(VekString("bool"), StringValue::Make(true, &poolM));
+  d->Add(VekString("double"), StringValue::Make(1.5, &poolM));
+  d->Add(VekString("int"), StringValue::Make(-7, &poolM));
+  d->Add(VekString("ll"), StringValue::Make(-7LL, &poolM));
+  d->Add(VekString("u"), StringValue::Make(7u, &poolM));
+  d->Add(VekString("ull"), StringValue::Make(18446744073709551615ULL, &poolM));
+  d->Add(VekString("text"), VekString("a\"b\\c\n"));
+  d->AddBytestring(VekString("bytes"), vek::ByteBuffer::New(&poolM, "foo", 3));
+  d->Add(VekString("k\"ey"), Bare(&poolM, "1.5"));
+  EXPECT_EQ(Compact(d),
+            R"({"bool": true, "bytes": "Zm9v", "double": "1.5", "int": -7, "k\"ey": "1.5", "ll": "-7", )"
+            R"("text": "a\"b\\c\n", "u": 7, "ull": "18446744073709551615"})");
+}
+
+TEST_F(DictValueTest, RepeatedNamesKeepEveryValueInOrder) {
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  ref<StringValue> one = Bare(&poolM, "1");
+  d->Add(VekString("x"), one);
+  d->Add(VekString("x"), Bare(&poolM, "2"));
+  d->Add(VekString("y"), ref<NullValue>(new (&poolM) NullValue()));
+  d->Add(VekString("x"), VekString("three"));
+  EXPECT_EQ(d->CountValues(VekString("x")), 3u);
+  EXPECT_EQ(d->CountNames(), 4u);
+  EXPECT_EQ(d->Get(VekString("x")).Get(), one.Get());
+  EXPECT_EQ(Compact(d), R"({"x": 1, "x": 2, "x": "three", "y": null})");
+  EXPECT_EQ(Pretty(d), "{\n    \"x\": 1, \n    \"x\": 2, \n    \"x\": \"three\", \n    \"y\": null\n}");
+
+  VekArray<DictValue> range(&poolM);
+  range.Add(one);  // GetRange appends, it does not clear
+  d->GetRange(VekString("x"), range);
+  ASSERT_EQ(range.Count(), 4);
+  EXPECT_EQ(Compact(range.Get(3)), "\"three\"");
+  VekStringArray texts(&poolM);
+  d->GetStringRange(VekString("y"), texts);
+  EXPECT_EQ(texts.Count(), 0);
+  d->GetStringRange(VekString("x"), texts);
+  ASSERT_EQ(texts.Count(), 3);
+  EXPECT_EQ(Str(texts[2]), "three");
+
+  EXPECT_TRUE(d->Remove(VekString("x")));
+  EXPECT_FALSE(d->Remove(VekString("x")));
+  EXPECT_EQ(d->CountNames(), 1u);
+  EXPECT_EQ(d->CountValues(VekString("x")), 0u);
+  EXPECT_EQ(Compact(d), R"({"y": null})");
+}
+
+TEST_F(DictValueTest, TypedLookupsAnswerEmptyForOtherKinds) {
+  ref<Dictionary> d = Dictionary::New(&poolM, VekString("thing"));
+  d->Add(VekString("list"), ref<ArrayValue>(new (&poolM) ArrayValue()));
+  d->Add(VekString("sub"), ref<Dictionary>(new (&poolM) Dictionary()));
+  EXPECT_EQ(Compact(d), R"({"list": [], "sub": {}, "type": "thing"})");
+  EXPECT_EQ(Str(d->GetString(VekString("type"))), "thing");
+  EXPECT_EQ(Str(d->GetString(VekString("list"))), "");
+  EXPECT_EQ(Str(d->GetString(VekString("absent"))), "");
+  EXPECT_TRUE(d->GetArray(VekString("list")));
+  EXPECT_FALSE(d->GetArray(VekString("sub")));
+  EXPECT_TRUE(d->GetDictionary(VekString("sub")));
+  EXPECT_FALSE(d->GetDictionary(VekString("type")));
+  EXPECT_FALSE(d->Get(VekString("absent")));
+  EXPECT_EQ(Compact(Dictionary::New(&poolM, VekString())), "{}");
+}
+
+TEST_F(DictValueTest, NamesAreWrittenInByteOrder) {
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  for (const char* name : {"b", "ab", "a", "B", "Type", "", "a\xC3\xA9"}) d->Add(VekString(name), Bare(&poolM, "1"));
+  VekStringArray names(&poolM);
+  names.Add(VekString("stale"));
+  d->GetSortedNames(names);
+  std::string joined;
+  for (int i = 0; i < names.Count(); ++i) joined += "|" + Str(names[i]);
+  EXPECT_EQ(joined, "||B|Type|a|ab|a\xC3\xA9|b");
+  EXPECT_EQ(Compact(d), "{\"\": 1, \"B\": 1, \"Type\": 1, \"a\": 1, \"ab\": 1, \"a\xC3\xA9\": 1, \"b\": 1}");
+}
+
+// Past a handful of names lookups go through an index and writing sorts in pool memory; removal
+// rebuilds both. Every name must stay reachable through all of that.
+TEST_F(DictValueTest, ManyNamesSurviveIndexGrowthAndRemoval) {
+  std::vector<std::string> names;
+  for (int i = 0; i < 3000; ++i) names.push_back("name" + std::to_string(i * 7919 % 3001));
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  for (const std::string& name : names) d->Add(Text(&poolM, name), Text(&poolM, "v" + name));
+  d->Add(Text(&poolM, names[5]), VekString("second"));
+  for (size_t i = 0; i < names.size(); i += 2) EXPECT_TRUE(d->Remove(Text(&poolM, names[i])));
+  EXPECT_EQ(d->CountNames(), 1500u + 1);
+  for (size_t i = 0; i < names.size(); ++i) {
+    VekString name = Text(&poolM, names[i]);
+    ASSERT_EQ(d->CountValues(name), i % 2 == 0 ? 0u : (i == 5 ? 2u : 1u)) << names[i];
+    if (i % 2 == 1) {
+      ASSERT_EQ(Str(d->GetString(name)), "v" + names[i]);
+    }
+  }
+  d->Add(Text(&poolM, names[0]), VekString("back"));
+  EXPECT_EQ(Str(d->GetString(Text(&poolM, names[0]))), "back");
+
+  std::vector<std::string> kept;
+  for (size_t i = 1; i < names.size(); i += 2) kept.push_back(names[i]);
+  kept.push_back(names[0]);
+  std::sort(kept.begin(), kept.end());
+  std::string json = Compact(d);
+  size_t at = 0;
+  for (const std::string& name : kept) {
+    size_t found = json.find("\"" + name + "\": ", at);
+    ASSERT_NE(found, std::string::npos) << name << " missing or out of order";
+    at = found + 1;
+  }
+}
+
+TEST_F(DictValueTest, EqualityFollowsTheReceiversRule) {
+  // {a: 1, <second>: 2, x: x1, x: x2}, with the names added in reverse order when asked.
+  auto make = [this](bool isReversed, const char* second, const char* x1, const char* x2) {
+    ref<Dictionary> d = new (&poolM) Dictionary();
+    if (isReversed) {
+      d->Add(VekString("x"), VekString(x1));
+      d->Add(VekString(second), Bare(&poolM, "2"));
+      d->Add(VekString("x"), VekString(x2));
+      d->Add(VekString("a"), Bare(&poolM, "1"));
+    } else {
+      d->Add(VekString("a"), Bare(&poolM, "1"));
+      d->Add(VekString(second), Bare(&poolM, "2"));
+      d->Add(VekString("x"), VekString(x1));
+      d->Add(VekString("x"), VekString(x2));
+    }
+    return d;
+  };
+  ref<Dictionary> a = make(false, "b", "p", "q");
+  EXPECT_TRUE(a->Equals(make(true, "b", "p", "q"))) << "name order does not matter";
+  EXPECT_FALSE(a->Equals(make(true, "b", "q", "p"))) << "value order under a name does";
+  EXPECT_FALSE(a->Equals(make(false, "c", "p", "q")));
+  EXPECT_FALSE(make(true, "b", "p", "p")->Equals(a));
+
+  ref<StringValue> quoted = StringValue::Make("5", &poolM);
+  EXPECT_TRUE(quoted->Equals(Bare(&poolM, "5"))) << "need-quotes is not compared";
+  ref<NullValue> null = new (&poolM) NullValue();
+  EXPECT_EQ(null->kindM, DictValue::KIND_NULL);
+  EXPECT_TRUE(null->Equals(ref<NullValue>(new (&poolM) NullValue())));
+  EXPECT_FALSE(null->Equals(StringValue::Make("null", &poolM)));
+  EXPECT_FALSE(StringValue::Make("null", &poolM)->Equals(null));
+  EXPECT_FALSE(null->Equals(ref<DictValue>()));
+
+  ref<ArrayValue> left = new (&poolM) ArrayValue();
+  ref<ArrayValue> right = new (&poolM) ArrayValue();
+  left->Add(a);
+  right->Add(make(true, "b", "p", "q"));
+  EXPECT_TRUE(left->Equals(right));
+  right->Add(null);
+  EXPECT_FALSE(left->Equals(right));
+  EXPECT_FALSE(left->Equals(a));
+  ref<Dictionary> payloadHolder = new (&poolM) Dictionary();
+  payloadHolder->Add(VekString("a"), LazyDict::FromDictionary(&poolM, a, 0));
+  ref<Dictionary> plainHolder = new (&poolM) Dictionary();
+  plainHolder->Add(VekString("a"), a);
+  EXPECT_FALSE(payloadHolder->Equals(plainHolder)) << "a payload never equals a dictionary";
+}
+
+TEST_F(DictValueTest, TypedReadersConvertOrLeaveTheOutputAlone) {
+  auto text = [this](const char* t) { return StringValue::Make(t, &poolM); };
+  int i = 99;
+  EXPECT_FALSE(text("2147483648")->GetValue(i));
+  EXPECT_EQ(i, 99);
+  EXPECT_TRUE(text("-2147483648")->GetValue(i));
+  EXPECT_EQ(i, -2147483647 - 1);
+  unsigned int u = 5;
+  EXPECT_FALSE(text("4294967296")->GetValue(u));
+  EXPECT_TRUE(text("4294967295")->GetValue(u));
+  EXPECT_EQ(u, 4294967295u);
+  bool b = false;
+  EXPECT_FALSE(text("True")->GetValue(b));
+  EXPECT_TRUE(text("true")->GetValue(b));
+  EXPECT_TRUE(b);
+  long long ll = 0;
+  EXPECT_TRUE(text("12abc")->GetValue(ll));
+  EXPECT_EQ(ll, 12);
+  EXPECT_FALSE(text("abc")->GetValue(ll));
+  double d = 0;
+  EXPECT_TRUE(text("-1.5e3")->GetValue(d));
+  EXPECT_EQ(d, -1500.0);
+  unsigned long long ull = 0;
+  EXPECT_TRUE(text("18446744073709551615")->GetValue(ull));
+  EXPECT_EQ(ull, 18446744073709551615ULL);
+  ref<vek::ByteBuffer> bytes;
+  EXPECT_TRUE(text("Zm9v")->GetValue(bytes));
+  EXPECT_EQ(Str(bytes), "foo");
+  EXPECT_TRUE(text("!!")->GetValue(bytes));
+  EXPECT_EQ(bytes->GetLength(), 0u);
+}
+
+TEST_F(DictValueTest, ArrayRemovesByObjectAndRefusesBadIndexes) {
+  ref<ArrayValue> array = new (&poolM) ArrayValue();
+  ref<StringValue> s = StringValue::Make("s", &poolM);
+  array->Add(s);
+  array->Add(VekString("t"));
+  array->Add(s);
+  EXPECT_FALSE(array->GetValueAt(3));
+  EXPECT_FALSE(array->Remove(3));
+  EXPECT_TRUE(array->Remove(2));  // the first element that is the same object: index 0
+  EXPECT_EQ(Compact(array), R"(["t", "s"])");
+  EXPECT_EQ(array->GetValueAt(1).Get(), s.Get());
+  EXPECT_EQ(array->CountValues(), 2);
+}
+
+// Trees built by hand have no depth limit; releasing one must not recurse per level.
+TEST_F(DictValueTest, ReleasesHandBuiltTreesOfAnyDepthInFlatStack) {
+  RunOnStack(256 * 1024, [this] {
+    ref<DictValue> root = new (&poolM) Dictionary();
+    DictValue* inner = root.Get();
+    for (int level = 0; level < 300000; ++level) {
+      ref<DictValue> child;
+      if (level % 3 == 0) {
+        child = new (&poolM) ArrayValue();
+      } else {
+        child = new (&poolM) Dictionary();
+      }
+      if (inner->kindM == DictValue::KIND_ARRAY) {
+        static_cast<ArrayValue*>(inner)->Add(child);
+      } else if (level % 3 == 2) {
+        // Every few levels the chain passes through a payload holding its Dictionary.
+        ref<Dictionary> next = ref<Dictionary>(static_cast<Dictionary*>(child.Get()));
+        static_cast<Dictionary*>(inner)->Add(VekString("p"), LazyDict::FromDictionary(&poolM, next, 0));
+      } else {
+        static_cast<Dictionary*>(inner)->Add(VekString("k"), child);
+      }
+      inner = child.Get();
+    }
+    root.Reset();
+  });
+  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+}
+
+}  // namespace

@@ -1,0 +1,215 @@
+// The hand-written reader: accepted shapes, every message with its inside-out joining, the
+// member entry points, the depth limit, and large documents.
+#include <string>
+#include <vector>
+
+#include "runtime/DictTestSupport.h"
+
+namespace {
+
+using namespace dicttest;
+using DictionaryJsonReaderTest = sarntest::PoolTest;
+
+struct Case {
+  const char* input;
+  const char* expected;  // the compact JSON of the tree, or the error message
+};
+
+TEST_F(DictionaryJsonReaderTest, AcceptsTolerantShapes) {
+  const Case cases[] = {
+      {"{}", "{}"},
+      {" \t\r\n{ } \t\r\n", "{}"},
+      {"{a:1}", R"({"a": 1})"},
+      {"{a:1,}", R"({"a": 1})"},
+      {"{9x-y.z:abc}", R"({"9x-y.z": abc})"},
+      {"{a:null, b:\"null\", c:true, d:12.5, e:1.2.3, f:\"\"}",
+       R"({"a": null, "b": "null", "c": true, "d": "12.5", "e": "1.2.3", "f": ""})"},
+      {"{a:[]}", R"({"a": []})"},
+      {"{\"a\" : [ 1 , [ ] , { } , \"x\" ] }", R"({"a": [1, [], {}, "x"]})"},
+      {R"({"u":"a\u00e9b","e":"\"\\\/\b\f\n\r\t"})", R"({"e": "\"\\/\b\f\n\r\t", "u": "a\u00e9b"})"},
+      {"{\"t\":\"caf\xC3\xA9\"}", "{\"t\": \"caf\xC3\xA9\"}"},
+      {"{\"open\":\"abc", "JSON object does not end with '}'."},
+  };
+  for (const Case& c : cases) {
+    std::string error;
+    ref<Dictionary> tree = Read(&poolM, c.input, &error);
+    EXPECT_EQ(tree ? Compact(tree) : error, c.expected) << c.input;
+    if (tree) {
+      EXPECT_EQ(error, "");
+    }
+  }
+  std::string error;
+  ref<Dictionary> tree = Read(&poolM, "{a:true, q:\"x\", u:\"\\u0041\"}", &error);
+  ASSERT_TRUE(tree);
+  EXPECT_FALSE(static_cast<StringValue*>(tree->Get(VekString("a")).Get())->needQuotesM);
+  EXPECT_TRUE(static_cast<StringValue*>(tree->Get(VekString("q")).Get())->needQuotesM);
+  EXPECT_EQ(Str(tree->GetString(VekString("u"))), "\\u0041") << "backslash-u stays as written";
+}
+
+TEST_F(DictionaryJsonReaderTest, RefusesWithMessagesJoinedFromTheInsideOut) {
+  const Case cases[] = {
+      {"", "JSON must start with '{'."},
+      {"   ", "JSON must start with '{'."},
+      {"[1]", "JSON must start with '{'."},
+      {"{} x", "Extra data after JSON."},
+      {"{}}", "Extra data after JSON."},
+      {"{-a:1}", "JSON object does not end with '}'."},
+      {"{,}", "JSON object does not end with '}'."},
+      {"{a:1 b:2}", "JSON object does not end with '}'."},
+      {"{a:1", "JSON object does not end with '}'."},
+      {"{\"a\":1,\"a\":2}", "Duplicate key: a"},
+      {"{\"a\" 1}", "JSON field name must be followed by a colon."},
+      {"{\"a\\q\":1}", "Failed to parse a Dictionary key."},
+      {"{a:}", "Empty scalar value for Object field a Failed to parse value for key a"},
+      {"{a:", "Empty scalar value for Object field a Failed to parse value for key a"},
+      {"{a:\"x\\qy\"}", "Can't parse scalar field for Object field a Failed to parse value for key a"},
+      {"{a:[1,]}", "Empty scalar value for Array element. Failed to parse an array member. Failed to parse value for key a"},
+      {"{a:[,]}", "Empty scalar value for Array element. Failed to parse an array element. Failed to parse value for key a"},
+      {"{a:[1 2]}", "Array must end with ']'. Failed to parse value for key a"},
+      {"{a:[1,", "Empty scalar value for Array element. Failed to parse an array member. Failed to parse value for key a"},
+      {"{a:[1", "Array must end with ']'. Failed to parse value for key a"},
+      {"{a:{b:[{c:1 2}]}}",
+       "JSON object does not end with '}'. Failed to parse an array element. Failed to parse value for key b "
+       "Failed to parse value for key a"},
+      {"{a:[0,{b:{c:1,c:2}}]}",
+       "Duplicate key: c Failed to parse value for key b Failed to parse an array member. Failed to parse value for key a"},
+      {"{a:{\"b\"}}", "JSON field name must be followed by a colon. Failed to parse value for key a"},
+  };
+  for (const Case& c : cases) {
+    std::string error = "stale";
+    EXPECT_FALSE(Read(&poolM, c.input, &error)) << c.input;
+    EXPECT_EQ(error, c.expected) << c.input;
+  }
+}
+
+// The member entry points read one piece and append their words to what the inner step said.
+TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
+  auto cursor = [](const std::string& text) {
+    return InputPointer(reinterpret_cast<const unsigned char*>(text.data()), text.size());
+  };
+  std::string text = " [1, {\"k\": x}] rest";
+  InputPointer input = cursor(text);
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  VekString error;
+  EXPECT_TRUE(d->ReadFieldValue(input, VekString("arr"), error));
+  EXPECT_EQ(Str(VekString::FromUtf8Bytes(nullptr, input.pEndM - input.pCurM, input.pCurM)), " rest");
+  EXPECT_TRUE(d->ReadFieldValue(input, VekString("word"), error));
+  EXPECT_EQ(Compact(d), R"({"arr": [1, {"k": x}], "word": rest})");
+
+  std::string bad = " }";
+  InputPointer badInput = cursor(bad);
+  EXPECT_FALSE(d->ReadFieldValue(badInput, VekString("z"), error));
+  EXPECT_EQ(Str(error), "Empty scalar value for Object field z");
+
+  ref<ArrayValue> array = new (&poolM) ArrayValue();
+  badInput = cursor(bad);
+  EXPECT_FALSE(array->ReadFieldValue(badInput, error));
+  EXPECT_EQ(Str(error), "Empty scalar value for Array element.");
+  badInput = cursor(bad);
+  EXPECT_FALSE(array->FromJson(badInput, error));
+  EXPECT_EQ(Str(error), "Array must start with '['.");
+  badInput = cursor(bad);
+  EXPECT_FALSE(d->FromJson(badInput, error));
+  EXPECT_EQ(Str(error), "JSON object does not start with '{'.");
+
+  std::string list = "[\"a\", [true]] tail";
+  InputPointer listInput = cursor(list);
+  EXPECT_TRUE(array->FromJson(listInput, error));
+  EXPECT_EQ(Compact(array), R"(["a", [true]])");
+}
+
+TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
+  int limit = JsonLimits::kDefaultMaxDepth;
+  ASSERT_GE(limit, 512);
+  std::string atLimit = Nested(limit);
+  std::string error;
+  // Reading, writing, comparing and releasing a tree at the limit fit in a 256 KiB stack.
+  RunOnStack(256 * 1024, [&] {
+    ref<Dictionary> tree = Read(&poolM, atLimit, &error);
+    ASSERT_TRUE(tree) << error;
+    std::string text = Compact(tree);
+    EXPECT_EQ(text.size(), atLimit.size() + (limit / 2) * 1);  // a space after each colon
+    ref<Dictionary> again = Read(&poolM, text);
+    ASSERT_TRUE(again);
+    EXPECT_TRUE(tree->Equals(again));
+    EXPECT_EQ(Pretty(tree).size() > text.size(), true);
+  });
+  EXPECT_FALSE(Read(&poolM, Nested(limit + 1), &error));
+  EXPECT_EQ(error.substr(0, 90), "JSON nesting exceeds the depth limit of 512 levels. Failed to parse an array element. "
+                                 "Fail");
+
+  // A limit of our own, with the exact joined text.
+  JsonLimits three(3);
+  EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three));
+  EXPECT_FALSE(Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
+  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 3 levels. Failed to parse value for key b "
+                   "Failed to parse an array member. Failed to parse value for key a");
+  EXPECT_FALSE(Read(&poolM, "{}", &error, JsonLimits(0)));
+  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 0 levels.");
+
+  // Deep input far past the limit is refused without descending into it.
+  EXPECT_FALSE(Read(&poolM, std::string(1, '{') + "a:" + std::string(1000000, '['), &error));
+}
+
+TEST_F(DictionaryJsonReaderTest, RefusesArraysPastThePlatformCount) {
+  std::string json = "{a:[";
+  for (int i = 0; i < 65535; ++i) json += "0,";
+  std::string fits = json;
+  fits.back() = ']';
+  fits += "}";
+  ref<Dictionary> tree = Read(&poolM, fits);
+  ASSERT_TRUE(tree);
+  EXPECT_EQ(tree->GetArray(VekString("a"))->CountValues(), 65535);
+  std::string error;
+  EXPECT_FALSE(Read(&poolM, json + "0]}", &error));
+  EXPECT_EQ(error, "JSON array holds more than 65535 elements. Failed to parse an array member. "
+                   "Failed to parse value for key a");
+}
+
+// About 5 MB of records: read, write compact and pretty, read both back to equal trees.
+TEST_F(DictionaryJsonReaderTest, ReadsAndRewritesAFiveMegabyteDocument) {
+  std::string json = "{\"records\": [";
+  for (int i = 0; i < 20000; ++i) {
+    if (i > 0) json += ", ";
+    json += "{\"id\": \"" + std::to_string(1000000000000LL + i) + "\", \"name\": \"record \\\"" + std::to_string(i) +
+            "\\\" caf\xC3\xA9\", \"n\": " + std::to_string(i * 3) + ", \"tags\": [\"a\", \"b\", null, true], " +
+            "\"nested\": {\"x\": 1.5, \"y\": [1, 2, 3], \"z\": {\"deep\": \"value " + std::to_string(i) +
+            "\"}}, \"pad\": \"" + std::string(150, 'p') + "\"}";
+  }
+  json += "]}";
+  ASSERT_GT(json.size(), 5000000u);
+  std::string error;
+  ref<Dictionary> tree = Read(&poolM, json, &error);
+  ASSERT_TRUE(tree) << error;
+  EXPECT_EQ(tree->GetArray(VekString("records"))->CountValues(), 20000);
+  ref<Dictionary> compact = Read(&poolM, Compact(tree));
+  ref<Dictionary> pretty = Read(&poolM, Pretty(tree));
+  ASSERT_TRUE(compact && pretty);
+  EXPECT_TRUE(tree->Equals(compact));
+  EXPECT_TRUE(tree->Equals(pretty));
+  EXPECT_EQ(Compact(compact), Compact(tree));
+}
+
+// A small document with its exact compact and pretty forms, kept as files.
+TEST_F(DictionaryJsonReaderTest, MatchesGoldenForms) {
+  std::string dir = std::string(std::getenv("SARN_SOURCE_DIR") ? std::getenv("SARN_SOURCE_DIR") : ".") +
+                    "/tests/data/dicts/";
+  std::string input, compact, pretty;
+  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.json", input));
+  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.compact.json", compact));
+  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.pretty.json", pretty));
+  std::string error;
+  ref<Dictionary> tree = Read(&poolM, input, &error);
+  ASSERT_TRUE(tree) << error;
+  EXPECT_EQ(Compact(tree) + "\n", compact);
+  EXPECT_EQ(Pretty(tree) + "\n", pretty);
+  ref<Dictionary> streamed = Parse(&poolM, input, &error);
+  ASSERT_TRUE(streamed) << error;
+  EXPECT_FALSE(streamed->Equals(tree)) << "only the streaming parser decodes the \\u escape of the title";
+  EXPECT_EQ(Str(streamed->GetString(VekString("title"))), "Caf\xC3\xA9 \"news\"\tfeed");
+  streamed->Remove(VekString("title"));
+  tree->Remove(VekString("title"));
+  EXPECT_TRUE(streamed->Equals(tree));
+}
+
+}  // namespace

@@ -1,0 +1,202 @@
+// The streaming parser: chunk splits, its differences from the hand-written reader, its messages,
+// the syntax-only mode, the depth limit and whole byte sources.
+#include <string>
+#include <vector>
+
+#include "runtime/DictTestSupport.h"
+
+namespace {
+
+using namespace dicttest;
+using JsonParserTest = sarntest::PoolTest;
+
+std::string Kinds(const ref<ArrayValue>& array) {
+  std::string kinds;
+  for (unsigned i = 0; i < array->CountValues(); ++i) {
+    ref<DictValue> value = array->GetValueAt(i);
+    if (value->kindM == DictValue::KIND_STRING) {
+      kinds += static_cast<StringValue*>(value.Get())->needQuotesM ? "q" : "b";
+    } else {
+      kinds += value->kindM == DictValue::KIND_NULL ? "n" : "?";
+    }
+  }
+  return kinds;
+}
+
+TEST_F(JsonParserTest, GivesOneTreeWhereverTheChunksSplit) {
+  std::string json = R"({"a": [1, "x", null, true], "b": {"c": "\u00e9\n", "d": 1.50e+3}})";
+  sarntest::ForEachSplit(json, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
+    bool isOk;
+    std::string error;
+    ref<Dictionary> tree = Parse(&poolM, chunks, &isOk, &error);
+    ASSERT_TRUE(isOk) << label << ": " << error;
+    EXPECT_EQ(Compact(tree), "{\"a\": [1, \"x\", null, true], \"b\": {\"c\": \"\xC3\xA9\\n\", \"d\": \"1.50e+3\"}}")
+        << label;
+    EXPECT_EQ(Kinds(tree->GetArray(VekString("a"))), "bqnb") << label;
+  });
+}
+
+TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberText) {
+  std::string error;
+  ref<Dictionary> tree = Parse(&poolM, R"({"k": 1, "k": -0.5E-7, "k": {"k": []}})", &error);
+  ASSERT_TRUE(tree) << error;
+  EXPECT_EQ(tree->CountValues(VekString("k")), 3u);
+  EXPECT_EQ(Compact(tree), R"({"k": 1, "k": "-0.5E-7", "k": {"k": []}})");
+}
+
+TEST_F(JsonParserTest, ReportsRefusals) {
+  std::string error;
+  for (const char* input : {"[1,2]", "42", "\"s\"", "null"}) {
+    bool isOk;
+    ref<Dictionary> tree = Parse(&poolM, {std::string_view(input)}, &isOk, &error);
+    EXPECT_FALSE(isOk) << input;
+    EXPECT_FALSE(tree) << input;
+    EXPECT_EQ(error, "The JSON must start with a '{' character") << input;
+  }
+  // yajl's own words for syntax errors; the tree built so far is kept for the caller.
+  bool isOk;
+  ref<Dictionary> partial = Parse(&poolM, {std::string_view(R"({"a":1,})")}, &isOk, &error);
+  EXPECT_FALSE(isOk);
+  EXPECT_EQ(error, "parse error: invalid object key (must be a string)\n");
+  EXPECT_EQ(Compact(partial), R"({"a": 1})");
+  for (const char* input : {"", "{\"a\"", "{a:1}", "{\"a\":tru}", "{\"a\":\"\xFF\"}", "{} {}", "{\"a\":1,}"}) {
+    EXPECT_FALSE(Parse(&poolM, input, &error)) << input;
+    EXPECT_NE(error, "") << input;
+    EXPECT_NE(error, "The JSON must start with a '{' character") << input;
+  }
+  EXPECT_FALSE(Parse(&poolM, "", &error));
+  EXPECT_EQ(error, "parse error: premature EOF\n") << "an empty text fails when the parse is ended";
+}
+
+TEST_F(JsonParserTest, SyntaxOnlyParseBuildsNothing) {
+  auto check = [this](const std::string& json, const JsonLimits& limits = JsonLimits()) {
+    JsonParser parser(&poolM, limits);
+    parser.BeginParse();
+    bool isOk = parser.ParseChunk(json.data(), json.size()) && parser.EndParse();
+    EXPECT_EQ(parser.pResultM, nullptr);
+    return isOk ? std::string("ok") : std::string(parser.pErrorTextM);
+  };
+  size_t before = poolM.GetUsedBytes();
+  EXPECT_EQ(check(R"({"a": [1, {"b": null}]})"), "ok");
+  EXPECT_EQ(check("[1, 2]"), "ok") << "any top-level value passes a syntax check";
+  EXPECT_EQ(check("{\"a\" 1}"), "parse error: object key and value must be separated by a colon (':')\n");
+  EXPECT_EQ(check(Nested(JsonLimits::kDefaultMaxDepth)), "ok");
+  EXPECT_EQ(check(Nested(JsonLimits::kDefaultMaxDepth + 1)), "JSON nesting exceeds the depth limit of 512 levels.");
+  EXPECT_EQ(check("[[[]]]", JsonLimits(2)), "JSON nesting exceeds the depth limit of 2 levels.");
+  EXPECT_EQ(poolM.GetUsedBytes(), before);
+}
+
+TEST_F(JsonParserTest, BoundsTheNestingDepth) {
+  std::string error;
+  RunOnStack(256 * 1024, [&] {
+    ref<Dictionary> tree = Parse(&poolM, Nested(JsonLimits::kDefaultMaxDepth), &error);
+    ASSERT_TRUE(tree) << error;
+    EXPECT_TRUE(tree->Equals(Read(&poolM, Nested(JsonLimits::kDefaultMaxDepth))));
+  });
+  bool isOk;
+  ref<Dictionary> partial = Parse(&poolM, {Nested(JsonLimits::kDefaultMaxDepth + 1)}, &isOk, &error);
+  EXPECT_FALSE(isOk);
+  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 512 levels.");
+  EXPECT_TRUE(partial) << "the part read before the limit stays with the caller";
+  EXPECT_FALSE(Parse(&poolM, R"({"a": {"b": {}}})", &error, JsonLimits(2)));
+  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 2 levels.");
+  EXPECT_TRUE(Parse(&poolM, R"({"a": {"b": 1}, "c": []})", &error, JsonLimits(2)));
+  // Ending a parse that a limit stopped keeps the limit as the reason.
+  PDictionary result;
+  JsonParser parser(&poolM, JsonLimits(1));
+  parser.BeginParse(result);
+  EXPECT_FALSE(parser.ParseChunk("{\"a\": [", 7));
+  EXPECT_FALSE(parser.EndParse());
+  EXPECT_STREQ(parser.pErrorTextM, "JSON nesting exceeds the depth limit of 1 levels.");
+}
+
+TEST_F(JsonParserTest, RefusesContainersPastThePlatformCount) {
+  std::string array = "{\"a\": [0";
+  for (int i = 1; i < 65535; ++i) array += ",0";
+  std::string error;
+  EXPECT_TRUE(Parse(&poolM, array + "]}", &error)) << "65,535 elements fit";
+  EXPECT_FALSE(Parse(&poolM, array + ",0]}", &error));
+  EXPECT_EQ(error, "JSON array holds more than 65535 elements.");
+  std::string keys = "{\"k\": 0";
+  for (int i = 1; i < 65536; ++i) keys += ",\"k\":0";
+  EXPECT_FALSE(Parse(&poolM, keys + "}", &error));
+  EXPECT_EQ(error, "JSON object repeats a key more than 65535 times.");
+}
+
+// A source that counts its deletion and can end in an error.
+class TestSource : public wynbaselib::InMemoryBytestream {
+ public:
+  TestSource(const std::string& text, bool* isDeleted, bool isFailing = false)
+      : InMemoryBytestream(text), pIsDeletedM(isDeleted), isFailingM(isFailing) {}
+  ~TestSource() override { *pIsDeletedM = true; }
+  bool FError() const override { return isFailingM; }
+  const char* GetErrorText() const override { return "truncated stream"; }
+
+ private:
+  bool* pIsDeletedM;
+  bool isFailingM;
+};
+
+TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
+  std::string json = "{\"list\": [";
+  for (int i = 0; i < 3000; ++i) json += (i ? ", " : "") + std::string("{\"i\": ") + std::to_string(i) + "}";
+  json += "]}";
+  bool isDeleted = false;
+  VekString error("untouched");
+  ref<Dictionary> tree = Dictionary::FromJsonBytesource(new TestSource(json, &isDeleted), error, &poolM);
+  EXPECT_TRUE(isDeleted);
+  EXPECT_EQ(Str(error), "untouched") << "success leaves the message as it was";
+  ASSERT_TRUE(tree);
+  EXPECT_TRUE(tree->Equals(Read(&poolM, json)));
+
+  isDeleted = false;
+  error = VekString();
+  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": [1, 2", &isDeleted), error, &poolM);
+  EXPECT_TRUE(isDeleted);
+  EXPECT_EQ(Str(error), "parse error: premature EOF\n");
+  EXPECT_EQ(Compact(tree), R"({"a": [1, 2]})") << "the partial tree is returned";
+
+  error = VekString();
+  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": 1}", &isDeleted, true), error, &poolM);
+  EXPECT_EQ(Str(error), "Byte source error: truncated stream");
+  error = VekString();
+  EXPECT_FALSE(Dictionary::FromJsonBytesource(new TestSource("[]", &isDeleted), error, &poolM));
+  EXPECT_EQ(Str(error), "The JSON must start with a '{' character");
+}
+
+TEST_F(JsonParserTest, StackAndEndingFollowTheirContracts) {
+  JsonParser::DictStack stack;
+  nonRef<DictValue> value;
+  JsonParser::State state;
+  EXPECT_FALSE(stack.Push(nullptr, JsonParser::StateMap));
+  EXPECT_FALSE(stack.Pop(value, state));
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  ref<ArrayValue> a = new (&poolM) ArrayValue();
+  EXPECT_TRUE(stack.Push(d.Get(), JsonParser::StateMap));
+  EXPECT_TRUE(stack.Push(a.Get(), JsonParser::StateArray));
+  EXPECT_TRUE(stack.PeekState(state));
+  EXPECT_EQ(state, JsonParser::StateArray);
+  EXPECT_TRUE(stack.Pop(value, state));
+  EXPECT_EQ(value.Get(), a.Get());
+  EXPECT_TRUE(stack.PeekDictValue(value));
+  EXPECT_EQ(value.Get(), d.Get());
+
+  // A second EndParse repeats the answer; a parser destroyed mid-document ends and frees itself.
+  PDictionary result;
+  {
+    JsonParser parser(&poolM);
+    parser.BeginParse(result);
+    EXPECT_EQ(parser.GetState(), JsonParser::StateNone);
+    EXPECT_TRUE(parser.ParseChunk("{\"a\": [", 7));
+    EXPECT_EQ(parser.GetState(), JsonParser::StateArray);
+  }
+  EXPECT_EQ(Compact(result), R"({"a": []})");
+  JsonParser parser(&poolM);
+  parser.BeginParse(result);
+  EXPECT_TRUE(parser.ParseChunk("{}", 2));
+  EXPECT_TRUE(parser.EndParse());
+  EXPECT_TRUE(parser.EndParse());
+  EXPECT_EQ(parser.pErrorTextM, nullptr);
+}
+
+}  // namespace
