@@ -21,11 +21,11 @@
 #include "sarn/SarnHashTable.h"
 #include "sarn/SarnUtil.h"
 #include "sarn/RpcV2Parser.h"
-
-// Every generated schema class (namespace sarnschema), from the build tree.
-#include "schema/sarn-schema.h"
 #include "sarn/Limits.h"
 #include "sarn/DictValue.h"
 #include "sarn/Dictionary.h"
 #include "sarn/JsonParser.h"
 #include "sarn/LazyDict.h"
+
+// Every generated schema class (namespace sarnschema), from the build tree.
+#include "schema/sarn-schema.h"
