@@ -161,8 +161,17 @@ class SARN_EXPORT RpcV2Parser {
   size_t responseCountCountM;
 
  private:
-  bool CacheEndsInCrLf() const;
-  State Fail(const char* message);
+#define SARN_RPCV2_HIDDEN __attribute__((visibility("hidden")))
+  // The bodies of the steps, called directly by ParseChunk.
+  SARN_RPCV2_HIDDEN State DoProcessFirstLine(const char*& cursor, const char* end);
+  SARN_RPCV2_HIDDEN State DoProcessHeaderLine(const char*& cursor, const char* end);
+  SARN_RPCV2_HIDDEN State DoValidateHeaderData();
+  SARN_RPCV2_HIDDEN State DoProcessBodyChunk(const char*& cursor, const char* end);
+  SARN_RPCV2_HIDDEN bool DoValidateHeaderPair(const char* key, const char* value);
+  SARN_RPCV2_HIDDEN void DoCacheUntilCrLfOrMax(const char*& cursor, const char* end, size_t max);
+  SARN_RPCV2_HIDDEN bool CacheEndsInCrLf() const;
+  SARN_RPCV2_HIDDEN State Fail(const char* message);
+#undef SARN_RPCV2_HIDDEN
 };
 
 }  // namespace sarn
