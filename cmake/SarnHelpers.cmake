@@ -16,6 +16,12 @@ if(SARN_SANITIZE)
   add_link_options(-fsanitize=address,undefined)
 endif()
 
+# A fuzzing build instruments all of our code for coverage, so that the fuzzers see inside the
+# libraries and not only their own file (the libFuzzer runtime comes with the fuzz targets).
+if(SARN_BUILD_FUZZERS AND CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+  add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+
 # Test executables link against this (gtest, the library, shared test helpers).
 function(sarn_add_test source)
   get_filename_component(_name ${source} NAME_WE)

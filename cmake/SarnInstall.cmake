@@ -1,6 +1,9 @@
 # Install rules: the libraries, the public headers, a CMake package config and a pkg-config file.
 include(CMakePackageConfigHelpers)
 
+# Installed libraries find each other beside themselves, wherever the prefix is (a program's
+# own run path does not apply to the dependencies of its libraries).
+set_target_properties(sarn vek wynbaselib PROPERTIES INSTALL_RPATH "$ORIGIN")
 install(TARGETS sarn vek wynbaselib EXPORT sarnTargets
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
   ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR}

@@ -34,9 +34,12 @@ class VekCore {
 
   VekMempool* GetMempool() const { return pMempoolM; }
   void UpRef() const { refCountM.fetch_add(1, std::memory_order_relaxed); }
-  // Drops one reference; the last one destroys the object.
+  // Drops one reference; the last one destroys the object. The sole holder needs no locked
+  // instruction: with the count at 1 nobody else can take a reference any more.
   void DownRef() const {
-    if (refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1) delete this;
+    if (refCountM.load(std::memory_order_acquire) == 1 || refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+      delete this;
+    }
   }
   uint32_t GetRefCount() const { return refCountM.load(std::memory_order_relaxed); }
 

@@ -47,7 +47,9 @@ VekString& VekString::operator=(VekString&& other) noexcept {
 }
 
 void VekString::Release() {
-  if (pRepM != nullptr && pRepM->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+  // The sole holder frees without a locked instruction (nobody else can copy it any more).
+  if (pRepM != nullptr && (pRepM->refCountM.load(std::memory_order_acquire) == 1 ||
+                           pRepM->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1)) {
     pRepM->pMempoolM->Free(pRepM);
   }
   pRepM = nullptr;

@@ -137,6 +137,7 @@ struct GunzipBytesource::State {
   bool isOpenM = false;
   bool isEndM = false;
   bool isMemberDoneM = false;  // the last member ended; only more input starts another
+  bool isSourceDoneM = false;  // the source returned 0: it is not asked again
   const char* pErrorM = nullptr;
   VekMempool* pMempoolM = nullptr;
   unsigned char inM[kChunk];
@@ -183,24 +184,27 @@ size_t GunzipBytesource::Read(void* buffer, size_t size) {
   s.streamM.next_out = static_cast<Bytef*>(buffer);
   s.streamM.avail_out = static_cast<uInt>(size);
   while (s.streamM.avail_out == size) {
-    if (s.streamM.avail_in == 0 && !s.Refill()) {
-      // The source is exhausted: clean only between members.
-      if (s.isMemberDoneM) {
-        s.isEndM = true;
-      } else {
-        s.pErrorM = "truncated gzip stream";
-      }
-      break;
-    }
+    if (s.streamM.avail_in == 0 && !s.isSourceDoneM && !s.Refill()) s.isSourceDoneM = true;
     if (s.isMemberDoneM) {
+      // Between members: the end of the source is a clean end, more bytes start a member.
+      if (s.streamM.avail_in == 0) {
+        s.isEndM = true;
+        break;
+      }
       inflateReset(&s.streamM);
       s.isMemberDoneM = false;
     }
+    // Called even when the source is exhausted: zlib may still hold decoded bytes (the rest
+    // of a match) that did not fit in the caller's last buffer.
     int status = inflate(&s.streamM, Z_NO_FLUSH);
     if (status == Z_STREAM_END) {
       s.isMemberDoneM = true;
     } else if (status == Z_BUF_ERROR && s.streamM.avail_in == 0) {
-      continue;  // needs more input; the loop refills
+      // No progress without more input.
+      if (s.isSourceDoneM) {
+        s.pErrorM = "truncated gzip stream";
+        break;
+      }
     } else if (status == Z_MEM_ERROR) {
       s.pErrorM = "out of memory in gzip decoder";
       break;
@@ -224,6 +228,7 @@ Bytesource* GunzipBytesource::Duplicate() {
   copy->pMempoolM = s.pMempoolM;
   copy->isEndM = s.isEndM;
   copy->isMemberDoneM = s.isMemberDoneM;
+  copy->isSourceDoneM = s.isSourceDoneM;
   copy->pErrorM = s.pErrorM;
   if (s.isOpenM) {
     std::memset(&copy->streamM, 0, sizeof copy->streamM);

@@ -116,7 +116,10 @@ TEST_F(GzipTest, TruncationAtEveryPositionIsAnErrorWithAPrefixOfTheText) {
   const std::string bytes = Gzip(text) + Gzip("tail");
   const size_t firstMember = Gzip(text).size();
   for (size_t cut = 0; cut <= bytes.size(); ++cut) {
-    Gunzipped part = Gunzip(bytes.substr(0, cut), cut % 2 == 0 ? 7 : 4096);
+    Gunzipped part = Gunzip(bytes.substr(0, cut), 1 << 16);
+    // Byte-sized reads must drain what zlib holds back when the input stops inside a match.
+    Gunzipped byBytes = Gunzip(bytes.substr(0, cut), 1);
+    EXPECT_EQ(byBytes.textM, part.textM) << "cut at " << cut;
     bool isClean = cut == firstMember || cut == bytes.size();
     EXPECT_EQ(part.isErrorM, !isClean) << "cut at " << cut;
     EXPECT_EQ(part.errorM, isClean ? "" : "truncated gzip stream") << "cut at " << cut;
