@@ -410,23 +410,4 @@ TEST(RpcV2ParserTest, LargeBodyStreamsThroughWithoutCopies) {
   EXPECT_EQ(log.PieceCount(), chunks);  // the first chunk holds the head and the body's start
 }
 
-TEST(RpcV2ParserTest, CacheStopsAtCrLfSplitAcrossChunks) {
-  EventLog log;
-  Recorder recorder(log);
-  RpcV2Parser parser(recorder);
-  const char input[] = "a\nb\rc\r\nd";
-  const char* cursor = input;
-  parser.CacheUntilCrLfOrMax(cursor, input + 6, 100);  // ends in CR: keeps waiting
-  EXPECT_EQ(parser.lineLengthM, 6u);
-  parser.CacheUntilCrLfOrMax(cursor, input + 8, 100);  // the LF completes the line, "d" stays
-  EXPECT_EQ(std::string(parser.lineBufferM, parser.lineLengthM), "a\nb\rc\r\n");
-  EXPECT_EQ(cursor, input + 7);
-  parser.lineLengthM = RpcV2Parser::LINE_LIMIT - 1;
-  parser.CacheUntilCrLfOrMax(cursor, input + 8, 0);  // max 0 copies nothing
-  parser.CacheUntilCrLfOrMax(cursor, input + 8, 100);
-  parser.CacheUntilCrLfOrMax(cursor, input + 8, 100);  // full and at the end: nothing
-  EXPECT_EQ(parser.lineLengthM, RpcV2Parser::LINE_LIMIT);
-  EXPECT_EQ(cursor, input + 8);
-}
-
 }  // namespace
