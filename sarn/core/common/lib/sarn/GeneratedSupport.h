@@ -17,6 +17,7 @@
 
 #include "sarn/Dict.h"
 #include "sarn/Export.h"
+#include "sarn/LazyDict.h"
 #include "sarn/SarnObject.h"
 #include "sarn/ScalarTypes.h"
 #include "sarn/Schema.h"
@@ -25,15 +26,6 @@
 #include "vek/VekCore.h"
 #include "vek/VekString.h"
 
-#if __has_include("sarn/LazyDict.h")
-#include "sarn/LazyDict.h"
-#else
-namespace sarn {
-// Stand-in until the lazy payload's own header exists: generated members only need a complete
-// reference-counted class to hold and release.
-class LazyDict : public VekCore {};
-}  // namespace sarn
-#endif
 
 namespace sarn {
 
