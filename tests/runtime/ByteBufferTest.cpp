@@ -43,6 +43,14 @@ TEST_F(ByteBufferTest, RunsGrowByTheirLengthPlusAFifth) {
   EXPECT_EQ(Capacity(buffer), 10256u + 1 + 2051);
   EXPECT_TRUE(buffer.AppendBytes(nullptr, 0));
   EXPECT_EQ(Contents(buffer), big + fill + "z");
+
+  // Reserve grows exactly as an append of that many bytes would, and only when it must.
+  EXPECT_TRUE(buffer.Reserve(2051));
+  EXPECT_EQ(Capacity(buffer), 12308u) << "2,052 spare bytes hold 2,051 and the spare byte";
+  EXPECT_TRUE(buffer.Reserve(2052));
+  EXPECT_EQ(Capacity(buffer), 12308u + 2052 + 2461);
+  EXPECT_EQ(Contents(buffer), big + fill + "z");
+  EXPECT_FALSE(buffer.Reserve(ULONG_MAX));
 }
 
 TEST_F(ByteBufferTest, AppendStringStopsAtTheNulAndRefusesImpossibleLengths) {

@@ -50,6 +50,12 @@ class SARN_EXPORT Vek1ByteBuffer {
     nUsedM += length;
     return true;
   }
+  // Makes room for `length` more bytes at once, growing as AppendBytes of that many would, so
+  // that a writer that knows its output size grows once instead of step by step.
+  bool Reserve(unsigned long length) {
+    if (length > static_cast<unsigned long>(PTRDIFF_MAX)) return false;
+    return length < bytesM->GetLength() - nUsedM || Grow(length);
+  }
   // Null while nothing was ever appended.
   const unsigned char* GetData() const { return bytesM->GetData(); }
   unsigned long GetLength() const { return static_cast<unsigned long>(nUsedM); }
@@ -74,6 +80,8 @@ class SARN_EXPORT ByteBuffer {
   bool AppendBytes(const unsigned char* data, unsigned long length) { return bufferM.AppendBytes(data, length); }
   // The bytes of `text` up to its NUL (not included), one at a time; null appends nothing.
   bool AppendString(const char* text);
+  // Makes room for `length` more bytes at once (see Vek1ByteBuffer::Reserve).
+  bool Reserve(unsigned long length) { return bufferM.Reserve(length); }
   const unsigned char* GetData() const { return bufferM.GetData(); }
   unsigned long GetLength() const { return bufferM.GetLength(); }
 

@@ -46,37 +46,73 @@ constexpr StopTable kStopG;
 
 const char kHexDigitsG[] = "0123456789ABCDEF";
 
+// The offset (0 to 7) of the first of the 8 bytes at `p` that may need an escape, or 8 when none
+// does. The classic "has a byte below n" test on v, v ^ '"' and v ^ '\\' finds bytes below
+// 0x20, quotes and backslashes; its lowest flag is always exact (only the flags above a true one
+// can be false). It also flags 0x03 and 0x1A, which the caller then lets through.
+inline unsigned FirstEscapeIn8(const unsigned char* p) {
+  constexpr uint64_t kOnes = 0x0101010101010101ull;
+  constexpr uint64_t kHighs = 0x8080808080808080ull;
+  uint64_t v;
+  std::memcpy(&v, p, sizeof v);
+  uint64_t quote = v ^ (kOnes * '"');
+  uint64_t backslash = v ^ (kOnes * '\\');
+  uint64_t hits = (((v - kOnes * 0x20) & ~v) | ((quote - kOnes) & ~quote) | ((backslash - kOnes) & ~backslash)) & kHighs;
+  return hits == 0 ? 8 : static_cast<unsigned>(__builtin_ctzll(hits)) / 8;
+}
+
+// The letter of a two-character escape, 0 for bytes written as backslash-u.
+struct ShortEscapeTable {
+  unsigned char vM[256];
+  constexpr ShortEscapeTable() : vM() {
+    vM[static_cast<unsigned char>('\b')] = 'b';
+    vM[static_cast<unsigned char>('\t')] = 't';
+    vM[static_cast<unsigned char>('\n')] = 'n';
+    vM[static_cast<unsigned char>('\f')] = 'f';
+    vM[static_cast<unsigned char>('\r')] = 'r';
+    vM[static_cast<unsigned char>('"')] = '"';
+    vM[static_cast<unsigned char>('\\')] = '\\';
+  }
+};
+constexpr ShortEscapeTable kShortEscapeG;
+
+// Input is escaped in slices; a slice of n bytes writes at most 6 n of output.
+constexpr size_t kSliceBytes = 512;
+constexpr size_t kSliceOutBytes = 6 * kSliceBytes;
+
 wynbaselib::InMemoryBytestream& EmptyStream() {
   static wynbaselib::InMemoryBytestream stream;
   return stream;
 }
 
+// Writers hand out room for one slice's output (Claim) and take back how much was used
+// (Commit), so the escaping loop stores bytes directly without a call per piece.
 class BufferOut {
  public:
-  explicit BufferOut(ByteBuffer& out) : outM(out) {}
-  void Put(const unsigned char* data, size_t n) { fOkM = outM.AppendBytes(data, n) && fOkM; }
-  bool Finish() { return fOkM; }
+  explicit BufferOut(ByteBuffer& out) : outM(out.bufferM) {}
+  void Expect(size_t n) { outM.Reserve(n); }
+  // Null when the buffer cannot grow.
+  unsigned char* Claim(size_t n) {
+    if (!outM.Reserve(n)) return nullptr;
+    return outM.bytesM->GetData() + outM.nUsedM;
+  }
+  void Commit(const unsigned char* end) { outM.nUsedM = static_cast<uint64_t>(end - outM.bytesM->GetData()); }
+  bool Finish() { return true; }
 
  private:
-  ByteBuffer& outM;
-  bool fOkM = true;
+  Vek1ByteBuffer& outM;
 };
 
-// Gathers small pieces so that the sink sees few, larger writes; long runs go straight through.
+// Stages the output on the stack and passes it to the sink one full stage at a time.
 class SinkOut {
  public:
   explicit SinkOut(wynbaselib::Bytesink& out) : outM(out) {}
-  void Put(const unsigned char* data, size_t n) {
-    if (n > sizeof stageM - nStagedM) {
-      Flush();
-      if (n >= sizeof stageM) {
-        fOkM = outM.Write(reinterpret_cast<const char*>(data), n) && fOkM;
-        return;
-      }
-    }
-    std::memcpy(stageM + nStagedM, data, n);
-    nStagedM += n;
+  void Expect(size_t) {}
+  unsigned char* Claim(size_t n) {
+    if (n > sizeof stageM - nStagedM) Flush();
+    return stageM + nStagedM;
   }
+  void Commit(const unsigned char* end) { nStagedM = static_cast<size_t>(end - stageM); }
   bool Finish() {
     Flush();
     return fOkM;
@@ -88,7 +124,7 @@ class SinkOut {
     nStagedM = 0;
   }
   wynbaselib::Bytesink& outM;
-  unsigned char stageM[512];
+  unsigned char stageM[2 * kSliceOutBytes + 2];
   size_t nStagedM = 0;
   bool fOkM = true;
 };
@@ -101,53 +137,71 @@ bool IsBare(const VekString& text) {
   return true;
 }
 
-template <class Out>
-bool WriteJsonString(const VekString& text, bool fBareAllowed, Out& out) {
-  static const unsigned char kQuote = '"';
-  bool isQuoted = !(fBareAllowed && IsBare(text));
-  if (isQuoted) out.Put(&kQuote, 1);
-  const unsigned char* p = reinterpret_cast<const unsigned char*>(text.Utf8());
-  const unsigned char* end = p + text.NByte();
-  const unsigned char* run = p;
+// Escapes [p, end) into `o`, which has room for 6 bytes per input byte; `textEnd` is where the
+// whole text ends (a backslash looks one byte ahead for a 'u'). Returns the new output end.
+unsigned char* EscapeSlice(const unsigned char* p, const unsigned char* end, const unsigned char* textEnd,
+                           unsigned char* o) {
   while (p != end) {
-    if (!kEscapeG.vM[*p]) {
-      ++p;
+    if (end - p >= 8) {
+      // Copy all 8 bytes, keep those before the first candidate.
+      unsigned k = FirstEscapeIn8(p);
+      std::memcpy(o, p, 8);
+      o += k;
+      p += k;
+      if (k == 8) continue;
+    }
+    unsigned char c = *p++;
+    if (!kEscapeG.vM[c]) {
+      *o++ = c;
       continue;
     }
-    out.Put(run, static_cast<size_t>(p - run));
-    unsigned char c = *p;
-    unsigned char escape[6] = {'\\', 0, 0, 0, 0, 0};
-    size_t n = 2;
-    switch (c) {
-      case '\b': escape[1] = 'b'; break;
-      case '\t': escape[1] = 't'; break;
-      case '\n': escape[1] = 'n'; break;
-      case '\f': escape[1] = 'f'; break;
-      case '\r': escape[1] = 'r'; break;
-      case '"': escape[1] = '"'; break;
-      case '\\':
-        // A backslash-u escape passes through as it is: only the backslash is written here and
-        // the 'u' follows as an ordinary byte.
-        if (p + 1 != end && p[1] == 'u') {
-          n = 1;
-        } else {
-          escape[1] = '\\';
-        }
-        break;
-      default:
-        escape[1] = 'u';
-        escape[2] = '0';
-        escape[3] = '0';
-        escape[4] = static_cast<unsigned char>(kHexDigitsG[c >> 4]);
-        escape[5] = static_cast<unsigned char>(kHexDigitsG[c & 15]);
-        n = 6;
-        break;
+    o[0] = '\\';
+    unsigned char letter = kShortEscapeG.vM[c];
+    if (c == '\\' && p != textEnd && *p == 'u') {
+      // A backslash-u escape passes through as it is: the 'u' follows as an ordinary byte.
+      o += 1;
+    } else if (letter != 0) {
+      o[1] = letter;
+      o += 2;
+    } else {
+      o[1] = 'u';
+      o[2] = '0';
+      o[3] = '0';
+      o[4] = static_cast<unsigned char>(kHexDigitsG[c >> 4]);
+      o[5] = static_cast<unsigned char>(kHexDigitsG[c & 15]);
+      o += 6;
     }
-    out.Put(escape, n);
-    run = ++p;
   }
-  out.Put(run, static_cast<size_t>(end - run));
-  if (isQuoted) out.Put(&kQuote, 1);
+  return o;
+}
+
+template <class Out>
+bool WriteJsonString(const VekString& text, bool fBareAllowed, Out& out) {
+  bool isQuoted = !(fBareAllowed && IsBare(text));
+  const unsigned char* p = reinterpret_cast<const unsigned char*>(text.Utf8());
+  const unsigned char* end = p + text.NByte();
+  // Room for the whole text up front, plus the worst case of the last slice: most texts need no
+  // escape, so a long one makes the buffer grow once rather than slice by slice.
+  size_t n = text.NByte();
+  out.Expect(n + 2 + 5 * (n < kSliceBytes ? n : kSliceBytes));
+  unsigned char* o = out.Claim(1);
+  if (o == nullptr) return false;
+  if (isQuoted) *o++ = '"';
+  out.Commit(o);
+  while (p != end) {
+    n = static_cast<size_t>(end - p) < kSliceBytes ? static_cast<size_t>(end - p) : kSliceBytes;
+    o = out.Claim(6 * n + 1);
+    if (o == nullptr) return false;
+    o = EscapeSlice(p, p + n, end, o);
+    out.Commit(o);
+    p += n;
+  }
+  if (isQuoted) {
+    o = out.Claim(1);
+    if (o == nullptr) return false;
+    *o++ = '"';
+    out.Commit(o);
+  }
   return out.Finish();
 }
 
