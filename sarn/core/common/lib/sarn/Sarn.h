@@ -26,6 +26,9 @@
 #include "sarn/Dictionary.h"
 #include "sarn/JsonParser.h"
 #include "sarn/LazyDict.h"
+#include "sarn/FieldAccess.h"
+#include "sarn/JsonSarnObject.h"
+#include "sarn/DictionarySarnObject.h"
 
 // Every generated schema class (namespace sarnschema), from the build tree.
 #include "schema/sarn-schema.h"

@@ -1,0 +1,219 @@
+// The object-to-JSON writer: exact bytes for every data type, the place of "type", version
+// filtering at the edges of ranges, null references, and depth without limit.
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "sarn/Sarn.h"
+#include "testutil/TestUtil.h"
+
+namespace {
+
+using namespace sarn;
+
+// Objects of hand-made types: raw zeroed storage after the header, described by local tables.
+class RawObject : public SarnObject {
+ public:
+  explicit RawObject(uint32_t typeId) : SarnObject(typeId) { std::memset(bytesM, 0, sizeof bytesM); }
+  unsigned char bytesM[64];
+};
+
+FieldInfo Field(unsigned dataType, unsigned arity, unsigned offset, unsigned nameOffset, unsigned minVersion = 7,
+                unsigned maxVersion = 42, unsigned refIndex = 0) {
+  FieldInfo field = {};
+  field.minVersion = static_cast<uint8_t>(minVersion);
+  field.maxVersion = static_cast<uint8_t>(maxVersion);
+  field.typeBits = MakeTypeBits(dataType, arity, 0);
+  field.valueOffset = static_cast<uint16_t>(offset);
+  field.refIndex = static_cast<uint16_t>(refIndex);
+  field.nameOffset = static_cast<uint16_t>(nameOffset);
+  return field;
+}
+
+StructInfo Struct(const char* name, const char* prefix, const std::vector<FieldInfo>& fields, const char* names) {
+  return StructInfo{name, prefix, static_cast<uint16_t>(fields.size()), fields.data(), nullptr, names, nullptr};
+}
+
+class JsonWriteTest : public sarntest::PoolTest {
+ protected:
+  std::string Write(const SarnObject* object, KernoVersion version, const StructInfo* const* defs = nullptr,
+                    uint32_t nDefs = 0) {
+    JsonSarnObject json(&poolM);
+    if (defs != nullptr) {
+      json.pStructDefsM = defs;
+      json.nStructDefsM = nDefs;
+    }
+    VekString text = json.SarnObjectToJson(object, version);
+    return std::string(text.Utf8(), text.NByte());
+  }
+};
+
+TEST_F(JsonWriteTest, TypeStandsBeforeTheLastFieldThatSortsBelowIt) {
+  const FieldInfo placeholder = {0, 0, {kPlaceholderTypeBits}, 0, 0, 0, 0};
+  std::vector<FieldInfo> first = {placeholder, Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0),
+                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 7),
+                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 32, 14)};
+  std::vector<FieldInfo> after = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0),
+                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 4)};
+  // apple exists only up to version 9: from 10 on nothing sorts below "type".
+  std::vector<FieldInfo> ranged = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0, 7, 9),
+                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 6)};
+  StructInfo a = Struct("a", nullptr, first, "bodyId\0number\0sourceProductDescription");
+  StructInfo b = Struct("b", nullptr, after, "uri\0value");
+  StructInfo c = Struct("c", nullptr, {}, "");
+  StructInfo d = Struct("d", nullptr, ranged, "apple\0zebra");
+  const StructInfo* defs[] = {nullptr, &a, &b, &c, &d};
+
+  RawObject oa(1), ob(2), oc(3), od(4);
+  EXPECT_EQ(Write(&oa, 0, defs, 5), "{\"bodyId\": 0, \"number\": 0, \"type\": \"a\", \"sourceProductDescription\": 0}");
+  EXPECT_EQ(Write(&ob, 42, defs, 5), "{\"uri\": 0, \"value\": 0, \"type\": \"b\"}");
+  EXPECT_EQ(Write(&oc, 42, defs, 5), "{\"type\": \"c\"}");
+  EXPECT_EQ(Write(&od, 9, defs, 5), "{\"type\": \"d\", \"apple\": 0, \"zebra\": 0}");
+  EXPECT_EQ(Write(&od, 10, defs, 5), "{\"zebra\": 0, \"type\": \"d\"}");
+  // An object whose type id names no table entry has nothing to say.
+  RawObject unknown(9);
+  EXPECT_EQ(Write(&unknown, 0, defs, 5), "{}");
+}
+
+TEST_F(JsonWriteTest, VersionFilterAtTheEdgesOfRanges) {
+  std::vector<FieldInfo> fields = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0, 10, 20),
+                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 2, 21, 42),
+                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 32, 4, 7, 7)};
+  StructInfo t = Struct("zz", nullptr, fields, "u\0v\0w");
+  const StructInfo* defs[] = {nullptr, &t};
+  RawObject o(1);
+  EXPECT_EQ(Write(&o, 7, defs, 2), "{\"w\": 0, \"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 9, defs, 2), "{\"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 10, defs, 2), "{\"u\": 0, \"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 20, defs, 2), "{\"u\": 0, \"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 21, defs, 2), "{\"v\": 0, \"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 43, defs, 2), "{\"type\": \"zz\"}");
+  EXPECT_EQ(Write(&o, 0, defs, 2), "{\"u\": 0, \"v\": 0, \"w\": 0, \"type\": \"zz\"}");
+}
+
+TEST_F(JsonWriteTest, UnsignedIdsAndUnknownDataTypes) {
+  std::vector<FieldInfo> fields = {Field(SARN_DATA_TYPE_U32, SARN_ARITY_REQUIRED, 24, 0),
+                                   Field(SARN_DATA_TYPE_U64, SARN_ARITY_REQUIRED, 32, 2),
+                                   Field(SARN_DATA_TYPE_INT_ID, SARN_ARITY_REQUIRED, 28, 4, 7, 42, 0),
+                                   Field(SARN_DATA_TYPE_INT_ID, SARN_ARITY_REQUIRED, 28, 6, 7, 42, 1),
+                                   Field(SARN_DATA_TYPE_LONG_ID, SARN_ARITY_REQUIRED, 32, 8, 7, 42, 2),
+                                   Field(SARN_DATA_TYPE_PLACEHOLDER, SARN_ARITY_REQUIRED, 24, 10)};
+  StructInfo t = Struct("t", "vask:t.", fields, "a\0b\0c\0d\0e\0f");
+  StructInfo plain = Struct("plain", nullptr, {}, "");
+  const StructInfo* defs[] = {nullptr, &t, &plain};
+  RawObject o(1);
+  uint32_t u32 = 7;
+  uint64_t u64 = 18446744073709551615ull;
+  std::memcpy(o.bytesM + 0, &u32, 4);
+  std::memcpy(o.bytesM + 4, &u32, 4);
+  std::memcpy(o.bytesM + 8, &u64, 8);
+  EXPECT_EQ(Write(&o, 0, defs, 3),
+            "{\"a\": 7, \"b\": \"18446744073709551615\", \"c\": \"XXX\", \"d\": \"vask:t.7\", "
+            "\"e\": \"xxx.281474976710655\", \"type\": \"t\"}");
+}
+
+TEST_F(JsonWriteTest, WorkedAddress) {
+  ref<SarnObject> object = sarnschema::Address::Factory(&poolM);
+  auto* address = static_cast<sarnschema::Address*>(object.Get());
+  address->addressIdM = 7;
+  address->fHasAddressIdM = true;
+  address->cityM = "Oslo";
+  address->countryM = "NO";
+  address->levelOfDetailM = 2;
+  address->fHasLevelOfDetailM = true;
+  address->postalCodeM = "0150";
+  address->street1M = "Main St 1";
+  address->street2M = "not written";
+  EXPECT_EQ(Write(address, 42),
+            "{\"addressId\": \"vask:ds.7\", \"city\": \"Oslo\", \"country\": \"NO\", \"levelOfDetail\": \"high\", "
+            "\"postalCode\": \"0150\", \"state\": \"\", \"street1\": \"Main St 1\", \"type\": \"address\"}");
+}
+
+TEST_F(JsonWriteTest, DefaultTestAllTypesWritesEveryRequiredForm) {
+  ref<SarnObject> object = sarnschema::TestAllTypes::Factory(&poolM);
+  // Null required references (anyDict, knownDict, struct, union) write nothing, commas stay right.
+  EXPECT_EQ(Write(object.Get(), 0),
+            "{\"boolean\": false, \"channelNumber\": \"invalid\", \"currency\": \"invalid\", \"date\": \"1970-01-01\", "
+            "\"dateTime\": \"1970-01-01 00:00:00\", \"enum\": \"sunday\", \"float\": \"0.0\", \"idBase64\": \"vask:ta.\", "
+            "\"idBody\": \"\", \"idInt\": \"vask:rc.0\", \"idLong\": \"vask:ct.0\", \"idString\": \"vask:of.\", "
+            "\"imageUrl\": \"\", \"int\": 0, \"long\": \"0\", \"string\": \"\", \"time\": \"00:00:00\", \"url\": \"\", "
+            "\"idLongAndType\": \"\", \"uri\": \"\", \"bytestring\": \"\", \"idAnyBody\": \"\", \"type\": \"testAllTypes\"}");
+}
+
+TEST_F(JsonWriteTest, ValuesOfOptionalAndMultiFields) {
+  ref<SarnObject> object = sarnschema::Success::Factory(&poolM);
+  ref<SarnObject> all = sarnschema::TestAllTypes::Factory(&poolM);
+  auto* t = static_cast<sarnschema::TestAllTypes*>(all.Get());
+  for (int v : {1, 2, 3}) t->intMultiM.Add(&v);
+  t->longOptionalM = -1;
+  t->fHasLongOptionalM = true;
+  t->enumOptionalM = 9;
+  t->fHasEnumOptionalM = true;
+  t->floatOptionalM = 123456789.0;
+  t->fHasFloatOptionalM = true;
+  t->stringOptionalM = VekString::FromUtf8Bytes(&poolM, 9, "q\"b\\t\tu\\u");
+  t->fHasStringOptionalM = true;
+  t->idLongOptionalM = (5ull << 48) + 12;
+  t->fHasIdLongOptionalM = true;
+  uint8_t flags[] = {1, 0};
+  t->booleanMultiM.Add(&flags[0]);
+  t->booleanMultiM.Add(&flags[1]);
+  // Null elements of an array of objects are left out; an array of only nulls is no array.
+  t->structMultiM.Add(nullptr);
+  t->structMultiM.Add(object.Get());
+  t->structMultiM.Add(nullptr);
+  t->unionMultiM.Add(nullptr);
+  std::string json = Write(t, 0);
+  EXPECT_NE(json.find("\"booleanMulti\": [true,false]"), std::string::npos) << json;
+  EXPECT_NE(json.find("\"enumOptional\": \"INVALID_VALUE:9\""), std::string::npos) << json;
+  EXPECT_NE(json.find("\"floatOptional\": \"1.2345679e+08\""), std::string::npos) << json;
+  EXPECT_NE(json.find("\"idLongOptional\": \"vask:ct.tms.ep.12\""), std::string::npos) << json;
+  EXPECT_NE(json.find("\"intMulti\": [1,2,3]"), std::string::npos) << json;
+  EXPECT_NE(json.find("\"longOptional\": \"-1\""), std::string::npos) << json;
+  EXPECT_NE(json.find("\"stringOptional\": \"q\\\"b\\\\t\\tu\\u\""), std::string::npos) << json;
+  EXPECT_NE(json.find("\"structMulti\": [{\"type\": \"success\"}], \"time\""), std::string::npos) << json;
+  EXPECT_EQ(json.find("unionMulti"), std::string::npos) << json;
+  EXPECT_EQ(json.find("\"stringMulti\""), std::string::npos) << json;
+}
+
+TEST_F(JsonWriteTest, LazyPayloadsWriteThemselvesAndObjectsTheirOwnVersion) {
+  ref<SarnObject> object = sarnschema::KernoRpcRequest::Factory(&poolM);
+  auto* request = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
+  request->requestM = LazyDict::FromJsonString(&poolM, "{\"type\":  \"ping\"}", 0);
+  std::string json = Write(request, 42);
+  EXPECT_EQ(json,
+            "{\"monitorFutureChanges\": false, \"request\": {\"type\":  \"ping\"}, \"rpcId\": 0, \"kernoVersion\": 0, "
+            "\"type\": \"kernoRpcRequest\"}");
+  // A payload holding an object is written under the payload's version, not the outer one.
+  ref<SarnObject> error = sarnschema::Error::Factory(&poolM);
+  auto* inner = static_cast<sarnschema::Error*>(error.Get());
+  inner->traceInfoM = Dict::New(&poolM, VekString());
+  request->requestM = LazyDict::FromSarnObject(&poolM, error, 26);
+  EXPECT_NE(Write(request, 42).find("\"request\": {\"code\": \"INVALID_VALUE:0\", \"text\": \"\", \"type\": \"error\"}"),
+            std::string::npos);
+  request->requestM = LazyDict::FromSarnObject(&poolM, error, 27);
+  EXPECT_NE(Write(request, 42).find("\"text\": \"\", \"type\": \"error\", \"traceInfo\": {}}"), std::string::npos);
+}
+
+TEST_F(JsonWriteTest, ObjectsOfAnyDepthAreWritten) {
+  const int kDepth = 100000;
+  std::vector<ref<SarnObject>> chain;
+  for (int i = 0; i < kDepth; ++i) {
+    chain.push_back(sarnschema::Error::Factory(&poolM));
+    static_cast<sarnschema::Error*>(chain.back().Get())->codeM = 3;
+    if (i > 0) static_cast<sarnschema::Error*>(chain[i - 1].Get())->causeM = chain.back();
+  }
+  std::string json = Write(chain.front().Get(), 0);
+  // Fields in number order: code, debug, text, retryInterval, cause, traceInfo ("type" before it).
+  const std::string head = "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
+  const std::string last = "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
+  const std::string tail = ", \"type\": \"error\"}";
+  ASSERT_EQ(json.size(), (kDepth - 1) * (head.size() + tail.size()) + last.size());
+  EXPECT_EQ(json.compare(0, head.size(), head), 0);
+  EXPECT_EQ(json.compare(json.size() - tail.size(), tail.size(), tail), 0);
+  // Released from the top so that no destructor recurses through the chain.
+  for (auto& link : chain) link.Reset();
+}
+
+}  // namespace

@@ -1,0 +1,144 @@
+// Fills schema objects through their metadata, for tests and benchmarks that need objects with
+// every field set: each value is derived from a seed, so two fills with the same seed are equal.
+// Header-only so that benchmarks can use it without the test library.
+#pragma once
+
+#include <cstdio>
+#include <cstring>
+
+#include "sarn/Sarn.h"
+
+namespace sarntest {
+
+// The first named value of enum `enumId` at or after `start` (wrapping), or 0.
+inline uint32_t SomeEnumValue(unsigned enumId, unsigned start) {
+  const sarn::EnumDef* def = sarn::EnumDefForId(enumId);
+  if (def == nullptr || def->nValue == 0) return 0;
+  for (uint64_t k = 0; k < def->nValue; ++k) {
+    uint64_t i = (start + k) % def->nValue;
+    if (def->vName[i] != nullptr) return static_cast<uint32_t>(i);
+  }
+  return 0;
+}
+
+// Sets every field that the current records describe (version 0), `nMulti` elements per array,
+// and nested objects down to `depth` more levels (KNOWN_DICT fields get a `success`). Strings hold
+// bytes that JSON must escape.
+inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed, int depth, unsigned nMulti = 2) {
+  using namespace sarn;
+  const StructInfo* info = object->GetStructInfo();
+  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+    const FieldInfo& field = info->vFieldInfo[n];
+    if (field.arity == SARN_ARITY_NONE) continue;
+    unsigned count = field.arity == SARN_ARITY_MULTI ? nMulti : 1;
+    for (unsigned e = 0; e < count; ++e) {
+      unsigned s = seed * 31 + n * 7 + e;
+      switch (field.dataType) {
+        case SARN_DATA_TYPE_BOOL: {
+          uint8_t v = s % 2;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_DATE: {
+          Date v;
+          v.daysM = 18000 + static_cast<int>(s % 1000);
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_TIME: {
+          Time v;
+          v.millisecondsM = static_cast<int>(s % 86400) * 1000;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_DATETIME: {
+          DateTime v;
+          v.millisecondsM = 1614863109000LL + static_cast<long long>(s) * 60000;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_ENUM: {
+          uint32_t v = SomeEnumValue(field.refIndex, s);
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_INT_ID:
+        case SARN_DATA_TYPE_S32:
+        case SARN_DATA_TYPE_U32: {
+          uint32_t v = field.dataType == SARN_DATA_TYPE_S32 ? static_cast<uint32_t>(-static_cast<int>(s)) : 1000 + s;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_CHANNEL_NUMBER: {
+          ChannelNumber v(static_cast<int>(s % 999) + 1, s % 2 ? -2 : 1);
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_CURRENCY: {
+          Currency v(static_cast<int>(s), "USD");
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_FLOAT: {
+          double v = s + 0.25;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_LONG_ID:
+        case SARN_DATA_TYPE_S64:
+        case SARN_DATA_TYPE_U64: {
+          uint64_t v = field.dataType == SARN_DATA_TYPE_S64 ? static_cast<uint64_t>(-1 - static_cast<long long>(s))
+                       : s % 3 == 0 ? (5ull << 48) + s * 1000003ull
+                                    : s * 1000003ull;
+          FieldAccess::PutScalar(object, field, &v);
+          break;
+        }
+        case SARN_DATA_TYPE_STRING:
+        case SARN_DATA_TYPE_STRING_ID: {
+          char text[64];
+          if (field.dataType == SARN_DATA_TYPE_STRING_ID) {
+            std::snprintf(text, sizeof text, "sid%u", s);
+          } else {
+            std::snprintf(text, sizeof text, "Text %u \"q\" \\ \xC3\xA9\t/end", s);
+          }
+          FieldAccess::PutString(object, field, VekString::FromUtf8Bytes(pool, std::strlen(text), text));
+          break;
+        }
+        case SARN_DATA_TYPE_BYTESTRING: {
+          unsigned char bytes[5] = {0, 1, static_cast<unsigned char>(s), 0xFE, 0xFF};
+          ref<vek::ByteBuffer> v = vek::ByteBuffer::New(pool, bytes, 1 + s % 5);
+          FieldAccess::PutReference(object, field, v.Get());
+          break;
+        }
+        case SARN_DATA_TYPE_ANY_DICT: {
+          ref<Dict> v = Dict::New(pool, VekString());
+          v->AddString("key", "value");
+          v->AddString("n", "1");
+          FieldAccess::PutReference(object, field, v.Get());
+          break;
+        }
+        case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
+          ref<LazyDict> v = LazyDict::FromJsonString(pool, "{\"type\": \"success\"}", 0);
+          FieldAccess::PutReference(object, field, v.Get());
+          break;
+        }
+        case SARN_DATA_TYPE_KNOWN_DICT:
+        case SARN_DATA_TYPE_SUBDICT: {
+          if (depth <= 0) break;
+          unsigned typeId = field.dataType == SARN_DATA_TYPE_SUBDICT ? field.refIndex : 543;  // success
+          const StructInfo* target = StructInfoForId(typeId);
+          if (target == nullptr) break;
+          ref<SarnObject> v = target->pFactory(pool);
+          FillObject(pool, v.Get(), s, depth - 1, nMulti);
+          FieldAccess::PutReference(object, field, v.Get());
+          break;
+        }
+        default:
+          break;
+      }
+    }
+    MarkFieldPresent(object, field);
+  }
+}
+
+}  // namespace sarntest
