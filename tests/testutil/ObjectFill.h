@@ -22,9 +22,10 @@ inline uint32_t SomeEnumValue(unsigned enumId, unsigned start) {
 }
 
 // Sets every field that the current records describe (version 0), `nMulti` elements per array,
-// and nested objects down to `depth` more levels (KNOWN_DICT fields get a `success`). Strings hold
-// bytes that JSON must escape.
-inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed, int depth, unsigned nMulti = 2) {
+// and nested objects down to `depth` more levels (required ones a little further) (KNOWN_DICT fields get a `success`). Strings hold
+// bytes that JSON must escape unless `fPlainText`.
+inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed, int depth, unsigned nMulti = 2,
+                       bool fPlainText = false) {
   using namespace sarn;
   const StructInfo* info = object->GetStructInfo();
   for (unsigned n = 0; n < info->nFieldInfo; ++n) {
@@ -98,6 +99,8 @@ inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed
           char text[64];
           if (field.dataType == SARN_DATA_TYPE_STRING_ID) {
             std::snprintf(text, sizeof text, "sid%u", s);
+          } else if (fPlainText) {
+            std::snprintf(text, sizeof text, "Some text of item %u", s);
           } else {
             std::snprintf(text, sizeof text, "Text %u \"q\" \\ \xC3\xA9\t/end", s);
           }
@@ -124,12 +127,13 @@ inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed
         }
         case SARN_DATA_TYPE_KNOWN_DICT:
         case SARN_DATA_TYPE_SUBDICT: {
-          if (depth <= 0) break;
+          // Past the depth only required objects are made (readers insist on them), up to a bound.
+          if (depth <= 0 && (field.arity != SARN_ARITY_REQUIRED || depth < -8)) break;
           unsigned typeId = field.dataType == SARN_DATA_TYPE_SUBDICT ? field.refIndex : 543;  // success
           const StructInfo* target = StructInfoForId(typeId);
           if (target == nullptr) break;
           ref<SarnObject> v = target->pFactory(pool);
-          FillObject(pool, v.Get(), s, depth - 1, nMulti);
+          FillObject(pool, v.Get(), s, depth - 1, nMulti, fPlainText);
           FieldAccess::PutReference(object, field, v.Get());
           break;
         }
