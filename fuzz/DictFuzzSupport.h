@@ -1,0 +1,96 @@
+// Oracles shared by the two JSON reader fuzz targets.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <vector>
+
+#include "sarn/Sarn.h"
+
+namespace dictfuzz {
+
+// The fuzzers report a broken oracle by crashing, which libFuzzer and the replay both catch.
+inline void Require(bool condition) {
+  if (!condition) std::abort();
+}
+
+// Whether a text holds what the writer passes through unescaped and yajl then reads back
+// differently: a backslash before 'u', or the raw bytes 0x03 and 0x1A.
+inline bool HasPassThrough(const VekString& text) {
+  const char* p = text.Utf8();
+  for (size_t i = 0; i < text.NByte(); ++i) {
+    if (p[i] == 0x03 || p[i] == 0x1A || (p[i] == '\\' && i + 1 < text.NByte() && p[i + 1] == 'u')) return true;
+  }
+  return false;
+}
+
+inline bool TreeHasPassThrough(const sarn::DictValue& value) {
+  using sarn::DictValue;
+  switch (value.kindM) {
+    case DictValue::KIND_STRING:
+      return HasPassThrough(static_cast<const sarn::StringValue&>(value).valueM);
+    case DictValue::KIND_ARRAY: {
+      const sarn::ArrayValue& array = static_cast<const sarn::ArrayValue&>(value);
+      for (unsigned i = 0; i < array.CountValues(); ++i) {
+        if (TreeHasPassThrough(*array.GetValueAt(i))) return true;
+      }
+      return false;
+    }
+    case DictValue::KIND_DICTIONARY: {
+      const sarn::Dictionary& dictionary = static_cast<const sarn::Dictionary&>(value);
+      VekStringArray names(dictionary.GetMempool());
+      dictionary.GetSortedNames(names);
+      for (int i = 0; i < names.Count(); ++i) {
+        if (HasPassThrough(names[i])) return true;
+        VekArray<DictValue> values(dictionary.GetMempool());
+        dictionary.GetRange(names[i], values);
+        for (int k = 0; k < values.Count(); ++k) {
+          if (TreeHasPassThrough(*values.Get(k))) return true;
+        }
+      }
+      return false;
+    }
+    default:
+      return false;
+  }
+}
+
+// Splits `size` bytes into chunks whose lengths come from `seed` bytes (1 to 64 each, cycling).
+inline std::vector<size_t> ChunkLengths(const uint8_t* seed, size_t nSeed, size_t size) {
+  std::vector<size_t> lengths;
+  for (size_t at = 0, i = 0; at < size; ++i) {
+    size_t n = nSeed == 0 ? size : 1 + seed[i % nSeed] % 64;
+    if (n > size - at) n = size - at;
+    lengths.push_back(n);
+    at += n;
+  }
+  return lengths;
+}
+
+// The streaming parser over `data` cut into the given chunks.
+inline ref<sarn::Dictionary> StreamParse(VekMempool* pool, const uint8_t* data, const std::vector<size_t>& lengths,
+                                         bool* isOk, const sarn::JsonLimits& limits) {
+  sarn::PDictionary result;
+  sarn::JsonParser parser(pool, limits);
+  parser.BeginParse(result);
+  bool ok = true;
+  size_t at = 0;
+  for (size_t n : lengths) {
+    if (!parser.ParseChunk(reinterpret_cast<const char*>(data + at), n)) {
+      ok = false;
+      break;
+    }
+    at += n;
+  }
+  *isOk = ok && parser.EndParse();
+  return result;
+}
+
+inline ref<sarn::Dictionary> StreamParseText(VekMempool* pool, const VekString& text, bool* isOk) {
+  std::vector<size_t> whole{text.NByte()};
+  if (text.NByte() == 0) whole.clear();
+  return StreamParse(pool, reinterpret_cast<const uint8_t*>(text.Utf8()), whole, isOk, sarn::JsonLimits());
+}
+
+}  // namespace dictfuzz

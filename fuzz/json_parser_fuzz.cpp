@@ -1,0 +1,53 @@
+// Fuzzes the streaming JSON parser. Byte 0 chooses a depth limit (low four bits; 0 keeps the
+// default) and how many of the following bytes choose the chunk lengths; the rest is the text.
+//
+// Oracles: whole and chunked feeding give the same verdict and equal trees; a tree parse never
+// accepts what the syntax-only mode refuses; an accepted tree written compact and pretty reads
+// back equal (except texts that hold a backslash before 'u' or the raw bytes 0x03 or 0x1A, which
+// the writer passes through and the tokenizer then reads differently); where the hand-written
+// reader also accepts the text and it holds no escapes, both trees are equal; no bytes stay in
+// the pool.
+#include <cstring>
+
+#include "DictFuzzSupport.h"
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  using namespace sarn;
+  if (size < 1) return 0;
+  JsonLimits limits = (data[0] & 15) == 0 ? JsonLimits() : JsonLimits(data[0] & 15);
+  size_t nSeed = (data[0] >> 4) & 7;
+  if (size < 1 + nSeed) return 0;
+  const uint8_t* seed = data + 1;
+  const uint8_t* json = data + 1 + nSeed;
+  size_t n = size - 1 - nSeed;
+  VekMempool pool("fuzz");
+  {
+    bool isWholeOk;
+    bool isChunkedOk;
+    std::vector<size_t> whole;
+    if (n > 0) whole.push_back(n);
+    ref<Dictionary> tree = dictfuzz::StreamParse(&pool, json, whole, &isWholeOk, limits);
+    ref<Dictionary> chunked =
+        dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(seed, nSeed, n), &isChunkedOk, limits);
+    dictfuzz::Require(isWholeOk == isChunkedOk);
+    if (isWholeOk) dictfuzz::Require(tree && chunked && tree->Equals(chunked));
+
+    JsonParser syntax(&pool, limits);
+    syntax.BeginParse();
+    bool isSyntaxOk = syntax.ParseChunk(reinterpret_cast<const char*>(json), n) && syntax.EndParse();
+    dictfuzz::Require(isSyntaxOk || !isWholeOk);
+
+    if (isWholeOk && !dictfuzz::TreeHasPassThrough(*tree)) {
+      for (bool pretty : {false, true}) {
+        bool isBackOk;
+        ref<Dictionary> back = dictfuzz::StreamParseText(&pool, tree->ToJson(pretty), &isBackOk);
+        dictfuzz::Require(isBackOk && back->Equals(tree));
+      }
+    }
+    VekString error;
+    ref<Dictionary> handTree = Dictionary::FromJson(json, n, error, &pool, limits);
+    if (handTree && isWholeOk && std::memchr(json, '\\', n) == nullptr) dictfuzz::Require(handTree->Equals(tree));
+  }
+  dictfuzz::Require(pool.GetUsedBytes() == 0);
+  return 0;
+}
