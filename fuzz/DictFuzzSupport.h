@@ -56,6 +56,28 @@ inline bool TreeHasPassThrough(const sarn::DictValue& value) {
   }
 }
 
+// The layout both targets share: byte 0 chooses a depth limit (low four bits; 0 keeps the
+// default) and how many of the following bytes (bits 4-6) choose chunk lengths; the rest is the
+// document.
+struct Input {
+  sarn::JsonLimits limitsM;
+  const uint8_t* pSeedM;
+  size_t nSeedM;
+  const uint8_t* pJsonM;
+  size_t nJsonM;
+};
+
+inline bool SplitInput(const uint8_t* data, size_t size, Input& input) {
+  if (size < 1) return false;
+  input.limitsM = (data[0] & 15) == 0 ? sarn::JsonLimits() : sarn::JsonLimits(data[0] & 15);
+  input.nSeedM = (data[0] >> 4) & 7;
+  if (size < 1 + input.nSeedM) return false;
+  input.pSeedM = data + 1;
+  input.pJsonM = data + 1 + input.nSeedM;
+  input.nJsonM = size - 1 - input.nSeedM;
+  return true;
+}
+
 // Splits `size` bytes into chunks whose lengths come from `seed` bytes (1 to 64 each, cycling).
 inline std::vector<size_t> ChunkLengths(const uint8_t* seed, size_t nSeed, size_t size) {
   std::vector<size_t> lengths;

@@ -1,6 +1,5 @@
-// Fuzzes the hand-written JSON reader. Byte 0 chooses a depth limit (low four bits; 0 keeps the
-// default) and how many of the following bytes choose the chunk lengths of the streaming parser
-// that reads the same text for comparison; the rest is the document.
+// Fuzzes the hand-written JSON reader. The leading bytes choose a depth limit and the chunk
+// lengths of the streaming parser that reads the same text for comparison (DictFuzzSupport.h).
 //
 // Oracles: a verdict with a message exactly on failure; writing an accepted tree compact and
 // pretty and reading it back gives an equal tree; where the streaming parser accepts the same
@@ -27,13 +26,11 @@ bool HasUnicodeEscapedControl(const VekString& text) {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   using namespace sarn;
-  if (size < 1) return 0;
-  JsonLimits limits = (data[0] & 15) == 0 ? JsonLimits() : JsonLimits(data[0] & 15);
-  size_t nSeed = (data[0] >> 4) & 7;
-  if (size < 1 + nSeed) return 0;
-  const uint8_t* seed = data + 1;
-  const uint8_t* json = data + 1 + nSeed;
-  size_t n = size - 1 - nSeed;
+  dictfuzz::Input input;
+  if (!dictfuzz::SplitInput(data, size, input)) return 0;
+  const JsonLimits& limits = input.limitsM;
+  const uint8_t* json = input.pJsonM;
+  size_t n = input.nJsonM;
   VekMempool pool("fuzz");
   {
     VekString error;
@@ -48,7 +45,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
       dictfuzz::Require(back && back->Equals(tree));
     }
     bool isOk;
-    ref<Dictionary> streamed = dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(seed, nSeed, n), &isOk, limits);
+    ref<Dictionary> streamed = dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(input.pSeedM, input.nSeedM, n), &isOk, limits);
     if (tree && isOk && std::memchr(json, '\\', n) == nullptr) dictfuzz::Require(streamed->Equals(tree));
   }
   dictfuzz::Require(pool.GetUsedBytes() == 0);

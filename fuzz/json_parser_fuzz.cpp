@@ -1,5 +1,5 @@
-// Fuzzes the streaming JSON parser. Byte 0 chooses a depth limit (low four bits; 0 keeps the
-// default) and how many of the following bytes choose the chunk lengths; the rest is the text.
+// Fuzzes the streaming JSON parser. The leading bytes choose a depth limit and the chunk lengths
+// (DictFuzzSupport.h).
 //
 // Oracles: whole and chunked feeding give the same verdict and equal trees; a tree parse never
 // accepts what the syntax-only mode refuses; an accepted tree written compact and pretty reads
@@ -13,13 +13,11 @@
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   using namespace sarn;
-  if (size < 1) return 0;
-  JsonLimits limits = (data[0] & 15) == 0 ? JsonLimits() : JsonLimits(data[0] & 15);
-  size_t nSeed = (data[0] >> 4) & 7;
-  if (size < 1 + nSeed) return 0;
-  const uint8_t* seed = data + 1;
-  const uint8_t* json = data + 1 + nSeed;
-  size_t n = size - 1 - nSeed;
+  dictfuzz::Input input;
+  if (!dictfuzz::SplitInput(data, size, input)) return 0;
+  const JsonLimits& limits = input.limitsM;
+  const uint8_t* json = input.pJsonM;
+  size_t n = input.nJsonM;
   VekMempool pool("fuzz");
   {
     bool isWholeOk;
@@ -28,7 +26,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (n > 0) whole.push_back(n);
     ref<Dictionary> tree = dictfuzz::StreamParse(&pool, json, whole, &isWholeOk, limits);
     ref<Dictionary> chunked =
-        dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(seed, nSeed, n), &isChunkedOk, limits);
+        dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(input.pSeedM, input.nSeedM, n), &isChunkedOk, limits);
     dictfuzz::Require(isWholeOk == isChunkedOk);
     if (isWholeOk) dictfuzz::Require(tree && chunked && tree->Equals(chunked));
 

@@ -188,6 +188,12 @@ TEST_F(DictionaryJsonReaderTest, ReadsAndRewritesAFiveMegabyteDocument) {
   EXPECT_TRUE(tree->Equals(compact));
   EXPECT_TRUE(tree->Equals(pretty));
   EXPECT_EQ(Compact(compact), Compact(tree));
+  // The streaming parser, 512 bytes at a time, builds the same tree (the text has no \u escapes).
+  VekString streamError;
+  ref<Dictionary> streamed =
+      Dictionary::FromJsonBytesource(new wynbaselib::InMemoryBytestream(json), streamError, &poolM);
+  ASSERT_TRUE(streamed) << Str(streamError);
+  EXPECT_TRUE(streamed->Equals(tree));
 }
 
 // A small document with its exact compact and pretty forms, kept as files.
