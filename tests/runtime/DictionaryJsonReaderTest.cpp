@@ -134,6 +134,16 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
     EXPECT_TRUE(tree->Equals(again));
     EXPECT_EQ(Pretty(tree).size() > text.size(), true);
   });
+  // Objects only, the costlier frames of the writer.
+  std::string objects;
+  for (int level = 1; level < limit; ++level) objects += "{\"k\":";
+  objects += "{}" + std::string(limit - 1, '}');
+  RunOnStack(256 * 1024, [&] {
+    ref<Dictionary> tree = Read(&poolM, objects, &error);
+    ASSERT_TRUE(tree) << error;
+    EXPECT_TRUE(tree->Equals(Read(&poolM, Pretty(tree))));
+    EXPECT_TRUE(tree->Equals(Parse(&poolM, Compact(tree))));
+  });
   EXPECT_FALSE(Read(&poolM, Nested(limit + 1), &error));
   EXPECT_EQ(error.substr(0, 90), "JSON nesting exceeds the depth limit of 512 levels. Failed to parse an array element. "
                                  "Fail");

@@ -25,7 +25,14 @@ const char kSpacesG[] = "                                                       
 // Output adaptors: the same walk writes to a buffer or to a sink.
 struct BufferOut {
   ByteBuffer& bufferM;
-  void Put(const char* data, size_t n) { bufferM.AppendBytes(reinterpret_cast<const unsigned char*>(data), n); }
+  void Put(const char* data, size_t n) {
+    // The pieces of the structure are one or two bytes: not worth a call to memcpy each.
+    if (n <= 2) {
+      for (size_t i = 0; i < n; ++i) bufferM.AppendByte(static_cast<unsigned char>(data[i]));
+    } else {
+      bufferM.AppendBytes(reinterpret_cast<const unsigned char*>(data), n);
+    }
+  }
   void Put(char c) { bufferM.AppendByte(static_cast<unsigned char>(c)); }
   void Text(const VekString& text, bool fBareAllowed) { Json::StringToJson(text, fBareAllowed, bufferM); }
   void Lazy(const LazyDict& payload, bool pretty) { payload.ToJsonByteBuffer(bufferM, pretty); }
@@ -112,10 +119,11 @@ class TreeWriter {
   static void Object(const Dictionary& dictionary, Out& out, JsonFormat format) {
     // The sorted order lives on the stack for the small objects that dominate; a larger one
     // borrows a block of the dictionary's pool for the duration of the write.
-    int32_t local[16];
-    int32_t* order = local;
+    Dictionary::SortKey local[16];
+    Dictionary::SortKey* order = local;
     if (dictionary.nNameM > 16) {
-      order = static_cast<int32_t*>(dictionary.GetMempool()->Malloc(sizeof(int32_t) * dictionary.nNameM));
+      order = static_cast<Dictionary::SortKey*>(
+          dictionary.GetMempool()->Malloc(sizeof(Dictionary::SortKey) * dictionary.nNameM));
       if (order == nullptr) return;
     }
     dictionary.SortedFirsts(order);
@@ -123,8 +131,8 @@ class TreeWriter {
     ++format.depthM;
     for (uint32_t k = 0; k < dictionary.nNameM; ++k) {
       if (k > 0) out.Put(", ", 2);
-      for (int32_t i = order[k]; i >= 0; i = dictionary.vEntryM[i].nextM) {
-        if (i != order[k]) out.Put(", ", 2);
+      for (int32_t i = order[k].entryM; i >= 0; i = dictionary.vEntryM[i].nextM) {
+        if (i != order[k].entryM) out.Put(", ", 2);
         NewLine(out, format);
         Indent(out, format);
         out.Text(dictionary.vEntryM[i].nameM, false);
@@ -183,8 +191,10 @@ void TreeWalk::Write(const DictValue& value, wynbaselib::Bytesink& out, JsonForm
 // Release queue
 
 namespace {
-thread_local DictValue* tReleaseQueueG = nullptr;
-thread_local bool tIsDrainingG = false;
+// Initial-exec: the queue is touched once per released container, and the general TLS model of
+// a shared library would cost a resolver call each time.
+thread_local DictValue* tReleaseQueueG __attribute__((tls_model("initial-exec"))) = nullptr;
+thread_local bool tIsDrainingG __attribute__((tls_model("initial-exec"))) = false;
 }  // namespace
 
 DictValue*& TreeRelease::Link(DictValue* value) {

@@ -243,22 +243,31 @@ void Dictionary::GetSortedNames(VekStringArray& out) const {
   out.Sort();
 }
 
-void Dictionary::SortedFirsts(int32_t* out) const {
+void Dictionary::SortedFirsts(SortKey* out) const {
   uint32_t n = 0;
   for (uint32_t i = 0; i < nEntryM; ++i) {
-    if (vEntryM[i].lastOrOrdinalM >= 0) out[n++] = static_cast<int32_t>(i);
+    if (vEntryM[i].lastOrOrdinalM < 0) continue;
+    const VekString& name = vEntryM[i].nameM;
+    unsigned char head[8] = {0, 0, 0, 0, 0, 0, 0, 0};
+    std::memcpy(head, name.Utf8(), std::min<size_t>(name.NByte(), 8));
+    uint64_t prefix = 0;
+    for (unsigned char byte : head) prefix = prefix << 8 | byte;
+    out[n++] = SortKey{prefix, static_cast<int32_t>(i)};
   }
   // Byte order, a shorter name before the longer one it starts (the order of GetSortedNames).
-  auto less = [this](int32_t a, int32_t b) {
-    const VekString& x = vEntryM[a].nameM;
-    const VekString& y = vEntryM[b].nameM;
+  // Equal prefixes (names that share eight bytes, or a short name against its NUL-extended
+  // twin) fall back to the whole names.
+  auto less = [this](const SortKey& a, const SortKey& b) {
+    if (a.prefixM != b.prefixM) return a.prefixM < b.prefixM;
+    const VekString& x = vEntryM[a.entryM].nameM;
+    const VekString& y = vEntryM[b.entryM].nameM;
     size_t nx = x.NByte(), ny = y.NByte();
     int c = std::memcmp(x.Utf8(), y.Utf8(), std::min(nx, ny));
     return c != 0 ? c < 0 : nx < ny;
   };
   if (n <= 16) {
     for (uint32_t i = 1; i < n; ++i) {
-      int32_t moving = out[i];
+      SortKey moving = out[i];
       uint32_t j = i;
       for (; j > 0 && less(moving, out[j - 1]); --j) out[j] = out[j - 1];
       out[j] = moving;

@@ -137,8 +137,14 @@ class SARN_EXPORT Dictionary : public DictValue {
   bool GrowEntries();
   bool RebuildIndex(uint32_t nSlot);
   void IndexInsert(int32_t entry);
-  // Indices of the first entry of every name, sorted by name bytes, into `out` (nNameM slots).
-  void SortedFirsts(int32_t* out) const;
+  // The first entry of every name in byte order of the names, into `out` (nNameM slots). The
+  // leading eight bytes of each name, read as a big-endian number, decide most comparisons
+  // without touching the name again.
+  struct SortKey {
+    uint64_t prefixM;
+    int32_t entryM;
+  };
+  void SortedFirsts(SortKey* out) const;
   bool EqualsDictionary(const Dictionary& other) const;
   friend class TreeWalk;
   friend class TreeWriter;

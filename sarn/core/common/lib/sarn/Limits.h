@@ -16,11 +16,12 @@ namespace sarn {
 // Bounds of the two JSON readers (Dictionary::FromJson* and JsonParser).
 struct SARN_EXPORT JsonLimits {
   // Nesting depth: how many containers (objects and arrays) may be open at once; the
-  // top-level object is level 1. The hand-written reader recurses twice per level and every
-  // walk over a tree (writing, comparing) once per level, so this bound is what keeps the
-  // native stack safe: at the default a whole read fits in a 256 KiB thread stack. A
-  // document nested exactly this deep is read; one level deeper is refused with
-  // JsonDepthLimitMessage. A limit below 1 refuses every document.
+  // top-level object is level 1. The readers keep their open containers off the native stack,
+  // but writing and comparing a tree recurse once per level, so this bound is what keeps those
+  // walks safe for every tree a reader builds: at the default a whole read, write, compare and
+  // release fits in a 256 KiB thread stack. A document nested exactly this deep is read; one
+  // level deeper is refused with the message of kJsonDepthLimitFormat. A limit below 1 refuses
+  // every document.
   static constexpr int kDefaultMaxDepth = 512;
 
   JsonLimits() : maxDepthM(kDefaultMaxDepth) {}
