@@ -400,17 +400,10 @@ bool JsonBytesourceToString(VekMempool* mempool, VekHashStringToStringNew* inter
       if (isQuoted) return false;
       break;
     }
-    if (!isQuoted) {
-      input.pCurM = p;
-      if (scratch) {
-        scratch->AppendBytes(run, static_cast<unsigned long>(p - run));
-        break;
-      }
-      result = VekString::FromUtf8Bytes(mempool, static_cast<size_t>(p - run), run);
-      return true;
-    }
-    if (*p == '"') {
-      input.pCurM = p + 1;
+    if (!isQuoted || *p == '"') {
+      // The token ends here: a bare token at the first byte outside its set, a quoted string
+      // at its closing quote.
+      input.pCurM = isQuoted ? p + 1 : p;
       if (scratch) {
         scratch->AppendBytes(run, static_cast<unsigned long>(p - run));
         break;
