@@ -74,26 +74,6 @@ TEST(SarnHashTableUtilTest, HashMatchesTheReference) {
   EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash(key), Hash("address"));
 }
 
-TEST(SarnHashTableUtilTest, DefaultOperations) {
-  using Keys = SarnHashTableUtilTemplate<const char*>;
-  char copy[] = "name";
-  EXPECT_TRUE(Keys::DefaultKeyCompare("name", copy));
-  EXPECT_FALSE(Keys::DefaultKeyCompare("name", "names"));
-  EXPECT_TRUE(Keys::DefaultKeyCompare(nullptr, nullptr));
-  EXPECT_FALSE(Keys::DefaultKeyCompare(nullptr, ""));
-  EXPECT_FALSE(Keys::DefaultKeyCompare("", nullptr));
-  const char* key = "x";
-  Keys::DefaultClear(key);
-  EXPECT_EQ(key, nullptr);
-  VekString value("abc");
-  SarnHashTableUtilTemplate<VekString>::DefaultClear(value);
-  EXPECT_TRUE(value.FEmpty());
-  EXPECT_TRUE(SarnHashTableUtilTemplate<VekString>::DefaultValueCompare(VekString("a"), VekString("a")));
-  EXPECT_EQ(SarnHashTableUtil::hashTableSizesG[0], 53);
-  EXPECT_EQ(SarnHashTableUtil::hashTableSizesG[12], 12582917);
-  EXPECT_EQ(SarnHashTableUtil::hashTableSizesG[15], 100663319);
-}
-
 // A small instantiation: 2 inline nodes, so blocks are exercised early.
 typedef SarnHashTable<const char*, VekString, 2, 256, SarnHashTableUtilTemplate<const char*>::DefaultHash,
                       SarnHashTableUtilTemplate<const char*>::DefaultKeyCompare,
