@@ -22,6 +22,7 @@
 #include "sarn/ScalarTypes.h"
 #include "sarn/StructInfoMap.h"
 #include "sarn/internal/ObjectText.h"
+#include "sarn/internal/TimeText.h"
 #include "sarn/internal/WalkStack.h"
 
 namespace sarn {
@@ -200,12 +201,24 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
       return Quoted(pool, FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
     case SARN_DATA_TYPE_CURRENCY:
       return Quoted(pool, FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
-    case SARN_DATA_TYPE_DATE:
-      return Quoted(pool, FieldAccess::ScalarValue<Date>(object, field, i).ToString());
-    case SARN_DATA_TYPE_DATETIME:
-      return Quoted(pool, FieldAccess::ScalarValue<DateTime>(object, field, i).ToString());
-    case SARN_DATA_TYPE_TIME:
-      return Quoted(pool, FieldAccess::ScalarValue<Time>(object, field, i).ToString());
+    case SARN_DATA_TYPE_DATE: {
+      Date date = FieldAccess::ScalarValue<Date>(object, field, i);
+      char text[10];
+      if (!internal::FormatDateText(date.daysM, text)) return Quoted(pool, date.ToString());
+      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+    }
+    case SARN_DATA_TYPE_DATETIME: {
+      DateTime dateTime = FieldAccess::ScalarValue<DateTime>(object, field, i);
+      char text[19];
+      if (!internal::FormatDateTimeText(dateTime.millisecondsM / 1000, text)) return Quoted(pool, dateTime.ToString());
+      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+    }
+    case SARN_DATA_TYPE_TIME: {
+      int64_t seconds = FieldAccess::ScalarValue<Time>(object, field, i).millisecondsM / 1000;
+      char text[8];
+      internal::FormatTimeOfDayText(seconds - internal::FloorDiv(seconds, 86400) * 86400, text);
+      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+    }
     case SARN_DATA_TYPE_ANY_DICT: {
       const Dict* dict = static_cast<const Dict*>(FieldAccess::ReferenceAt(object, field, i));
       if (dict == nullptr) return nullptr;

@@ -20,6 +20,7 @@
 #include "sarn/ScalarTypes.h"
 #include "sarn/internal/ObjectText.h"
 #include "sarn/internal/TextOut.h"
+#include "sarn/internal/TimeText.h"
 #include "sarn/internal/WalkStack.h"
 
 namespace sarn {
@@ -42,6 +43,13 @@ void AppendQuoted(VekMempool* pool, const char* text, size_t length, ByteBuffer&
 }
 
 void AppendQuoted(const VekString& text, ByteBuffer& out) { Json::StringToJson(text, false, out); }
+
+// `text` holds `length` plain bytes from text[1] on; quotes them in place and appends.
+void QuoteInPlace(char* text, size_t length, ByteBuffer& out) {
+  text[0] = '"';
+  text[length + 1] = '"';
+  AppendText(out, text, length + 2);
+}
 
 bool HoldsObjects(unsigned dataType) {
   return dataType == SARN_DATA_TYPE_KNOWN_DICT || dataType == SARN_DATA_TYPE_SUBDICT ||
@@ -296,15 +304,34 @@ void JsonSarnObject::WriteValue(const FieldInfo& field, const SarnObject* object
     case SARN_DATA_TYPE_CURRENCY:
       AppendQuoted(FieldAccess::ScalarValue<Currency>(object, field, i).ToString(), out);
       break;
-    case SARN_DATA_TYPE_DATE:
-      AppendQuoted(FieldAccess::ScalarValue<Date>(object, field, i).ToString(), out);
+    case SARN_DATA_TYPE_DATE: {
+      Date date = FieldAccess::ScalarValue<Date>(object, field, i);
+      char text[12];
+      if (internal::FormatDateText(date.daysM, text + 1)) {
+        QuoteInPlace(text, 10, out);
+      } else {
+        AppendQuoted(date.ToString(), out);
+      }
       break;
-    case SARN_DATA_TYPE_DATETIME:
-      AppendQuoted(FieldAccess::ScalarValue<DateTime>(object, field, i).ToString(), out);
+    }
+    case SARN_DATA_TYPE_DATETIME: {
+      // Milliseconds are dropped by truncation, as a division of the signed count does.
+      DateTime dateTime = FieldAccess::ScalarValue<DateTime>(object, field, i);
+      char text[21];
+      if (internal::FormatDateTimeText(dateTime.millisecondsM / 1000, text + 1)) {
+        QuoteInPlace(text, 19, out);
+      } else {
+        AppendQuoted(dateTime.ToString(), out);
+      }
       break;
-    case SARN_DATA_TYPE_TIME:
-      AppendQuoted(FieldAccess::ScalarValue<Time>(object, field, i).ToString(), out);
+    }
+    case SARN_DATA_TYPE_TIME: {
+      int64_t seconds = FieldAccess::ScalarValue<Time>(object, field, i).millisecondsM / 1000;
+      char text[10];
+      internal::FormatTimeOfDayText(seconds - internal::FloorDiv(seconds, 86400) * 86400, text + 1);
+      QuoteInPlace(text, 8, out);
       break;
+    }
     case SARN_DATA_TYPE_ANY_DICT: {
       const Dict* dict = static_cast<const Dict*>(FieldAccess::ReferenceAt(object, field, i));
       if (dict != nullptr) dict->GetDictionary()->ToJson(out, JsonFormat(false));

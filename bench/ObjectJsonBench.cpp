@@ -1,0 +1,139 @@
+// Objects as text: a recordingList body of about 200 KB and one of about 5 MB, built as objects,
+// written to JSON (MB/s of output) and converted to a Dictionary and back (objects/s). The anchor
+// is RapidJSON's Writer writing the same text from its DOM in the same run.
+// Counters: pool bytes per KB of JSON held by the objects ("objectPoolPerKB") and by the
+// Dictionary tree ("treePoolPerKB").
+#include <benchmark/benchmark.h>
+
+#include <map>
+#include <memory>
+#include <string>
+
+#include "../tests/testutil/ObjectFill.h"
+#include "rapidjson/document.h"
+#include "rapidjson/stringbuffer.h"
+#include "rapidjson/writer.h"
+#include "sarn/Sarn.h"
+
+namespace {
+
+using namespace sarn;
+
+constexpr KernoVersion kVersion = 42;
+
+struct Body {
+  VekMempool poolM{"bench-objects"};
+  ref<SarnObject> listM;
+  std::string jsonM;
+  size_t nObjectM = 0;
+  size_t objectBytesM = 0;
+};
+
+std::string Json(VekMempool* pool, const SarnObject* object) {
+  JsonSarnObject json(pool);
+  VekString text = json.SarnObjectToJson(object, kVersion);
+  return std::string(text.Utf8(), text.NByte());
+}
+
+// A recordingList of filled recordings (their nested objects one level deep), grown until its JSON
+// reaches `targetBytes`.
+Body& GetBody(size_t targetBytes) {
+  static std::map<size_t, std::unique_ptr<Body>> bodies;
+  std::unique_ptr<Body>& body = bodies[targetBytes];
+  if (body) return *body;
+  body.reset(new Body);
+  VekMempool* pool = &body->poolM;
+  body->listM = sarnschema::RecordingList::Factory(pool);
+  auto* list = static_cast<sarnschema::RecordingList*>(body->listM.Get());
+  VekMempool scratch("bench-scratch");
+  size_t perRecording = 0;
+  for (unsigned i = 0; perRecording == 0 || list->recordingM.Count() * perRecording < targetBytes; ++i) {
+    ref<SarnObject> recording = sarnschema::Recording::Factory(pool);
+    sarntest::FillObject(pool, recording.Get(), i, 1, 2, true);
+    list->recordingM.Add(recording.Get());
+    if (perRecording == 0) perRecording = Json(&scratch, recording.Get()).size();
+  }
+  body->jsonM = Json(&scratch, list);
+  for (size_t at = body->jsonM.find("\"type\": "); at != std::string::npos; at = body->jsonM.find("\"type\": ", at + 1)) {
+    ++body->nObjectM;
+  }
+  body->objectBytesM = pool->GetUsedBytes();
+  return *body;
+}
+
+void BM_ObjectToJson(benchmark::State& state) {
+  Body& body = GetBody(static_cast<size_t>(state.range(0)));
+  VekMempool pool("bench-json");
+  JsonSarnObject json(&pool);
+  size_t length = 0;
+  for (auto _ : state) {
+    ByteBuffer out(&pool);
+    json.SarnObjectToJson(body.listM.Get(), kVersion, out);
+    length = out.GetLength();
+    benchmark::DoNotOptimize(out.GetData());
+  }
+  state.SetBytesProcessed(static_cast<int64_t>(state.iterations() * length));
+  state.counters["objectPoolPerKB"] = static_cast<double>(body.objectBytesM) / (body.jsonM.size() / 1024.0);
+}
+
+void BM_RapidJsonWriter(benchmark::State& state) {
+  Body& body = GetBody(static_cast<size_t>(state.range(0)));
+  rapidjson::Document document;
+  document.Parse(body.jsonM.c_str(), body.jsonM.size());
+  if (document.HasParseError()) {
+    state.SkipWithError("the body does not parse");
+    return;
+  }
+  size_t length = 0;
+  for (auto _ : state) {
+    rapidjson::StringBuffer out;
+    rapidjson::Writer<rapidjson::StringBuffer> writer(out);
+    document.Accept(writer);
+    length = out.GetSize();
+    benchmark::DoNotOptimize(out.GetString());
+  }
+  state.SetBytesProcessed(static_cast<int64_t>(state.iterations() * length));
+}
+
+void BM_ObjectToDictionary(benchmark::State& state) {
+  Body& body = GetBody(static_cast<size_t>(state.range(0)));
+  VekMempool pool("bench-tree");
+  DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
+  size_t treeBytes = 0;
+  for (auto _ : state) {
+    ref<Dictionary> tree = converter.SarnObjectToDictionary(body.listM.Get(), kVersion);
+    treeBytes = pool.GetUsedBytes();
+    benchmark::DoNotOptimize(tree.Get());
+  }
+  state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * body.nObjectM));
+  state.counters["treePoolPerKB"] = static_cast<double>(treeBytes) / (body.jsonM.size() / 1024.0);
+}
+
+void BM_DictionaryToObject(benchmark::State& state) {
+  Body& body = GetBody(static_cast<size_t>(state.range(0)));
+  VekMempool pool("bench-tree");
+  DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
+  ref<Dictionary> tree = converter.SarnObjectToDictionary(body.listM.Get(), kVersion);
+  for (auto _ : state) {
+    ref<SarnObject> object;
+    VekString error;
+    if (!converter.DictionaryToSarnObject(tree, kVersion, object, error)) {
+      state.SkipWithError(error.Utf8());
+      break;
+    }
+    benchmark::DoNotOptimize(object.Get());
+  }
+  state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * body.nObjectM));
+}
+
+constexpr int64_t kSmall = 200 * 1024;
+constexpr int64_t kLarge = 5 * 1024 * 1024;
+
+BENCHMARK(BM_ObjectToJson)->Arg(kSmall)->Arg(kLarge)->Unit(benchmark::kMicrosecond);
+BENCHMARK(BM_RapidJsonWriter)->Arg(kSmall)->Arg(kLarge)->Unit(benchmark::kMicrosecond);
+BENCHMARK(BM_ObjectToDictionary)->Arg(kSmall)->Arg(kLarge)->Unit(benchmark::kMicrosecond);
+BENCHMARK(BM_DictionaryToObject)->Arg(kSmall)->Arg(kLarge)->Unit(benchmark::kMicrosecond);
+
+}  // namespace
+
+BENCHMARK_MAIN();
