@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "testutil/ObjectFill.h"
 #include "testutil/TestUtil.h"
 
 namespace {
@@ -47,16 +48,8 @@ class DictionaryObjectTest : public sarntest::PoolTest {
 };
 
 TEST_F(DictionaryObjectTest, WorkedAddressBothWays) {
-  ref<SarnObject> object = sarnschema::Address::Factory(&poolM);
+  ref<SarnObject> object = sarntest::MakeWorkedAddress(&poolM);
   auto* address = static_cast<sarnschema::Address*>(object.Get());
-  address->addressIdM = 7;
-  address->fHasAddressIdM = true;
-  address->cityM = "Oslo";
-  address->countryM = "NO";
-  address->levelOfDetailM = 2;
-  address->fHasLevelOfDetailM = true;
-  address->postalCodeM = "0150";
-  address->street1M = "Main St 1";
   ref<Dictionary> tree = converterM.SarnObjectToDictionary(address, 42);
   const char* text =
       "{\"addressId\": \"vask:ds.7\", \"city\": \"Oslo\", \"country\": \"NO\", \"levelOfDetail\": \"high\", "

@@ -145,4 +145,20 @@ inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed
   }
 }
 
+// The address of the worked example: id 7, Oslo, NO, level of detail high, postal code 0150, an
+// empty state, street1 Main St 1, no street2.
+inline ref<sarn::SarnObject> MakeWorkedAddress(VekMempool* pool) {
+  ref<sarn::SarnObject> object = sarnschema::Address::Factory(pool);
+  auto* address = static_cast<sarnschema::Address*>(object.Get());
+  address->addressIdM = 7;
+  address->fHasAddressIdM = true;
+  address->cityM = "Oslo";
+  address->countryM = "NO";
+  address->levelOfDetailM = 2;
+  address->fHasLevelOfDetailM = true;
+  address->postalCodeM = "0150";
+  address->street1M = "Main St 1";
+  return object;
+}
+
 }  // namespace sarntest

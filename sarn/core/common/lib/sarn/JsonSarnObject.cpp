@@ -366,16 +366,16 @@ void JsonSarnObject::WriteValue(const FieldInfo& field, const SarnObject* object
       break;
     }
     case SARN_DATA_TYPE_S64:
-      internal::AppendSigned(out, FieldAccess::ScalarValue<int64_t>(object, field, i), true);
+      internal::AppendInteger(out, FieldAccess::ScalarValue<int64_t>(object, field, i), true);
       break;
     case SARN_DATA_TYPE_S32:
-      internal::AppendSigned(out, FieldAccess::ScalarValue<int32_t>(object, field, i), false);
+      internal::AppendInteger(out, FieldAccess::ScalarValue<int32_t>(object, field, i), false);
       break;
     case SARN_DATA_TYPE_U32:
-      internal::AppendUnsigned(out, FieldAccess::ScalarValue<uint32_t>(object, field, i), false);
+      internal::AppendInteger(out, FieldAccess::ScalarValue<uint32_t>(object, field, i), false);
       break;
     case SARN_DATA_TYPE_U64:
-      internal::AppendUnsigned(out, FieldAccess::ScalarValue<uint64_t>(object, field, i), true);
+      internal::AppendInteger(out, FieldAccess::ScalarValue<uint64_t>(object, field, i), true);
       break;
     case SARN_DATA_TYPE_STRING:
       AppendQuoted(FieldAccess::StringAt(object, field, i), out);

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <type_traits>
 
 #include "sarn/ByteBuffer.h"
 #include "sarn/internal/NumberText.h"
@@ -15,20 +16,17 @@ inline void AppendText(ByteBuffer& out, const char* text, size_t length) {
   out.AppendBytes(reinterpret_cast<const unsigned char*>(text), length);
 }
 
-// "%llu" of the value, in double quotes when `fQuoted`.
-inline void AppendUnsigned(ByteBuffer& out, uint64_t value, bool fQuoted) {
+// "%llu" or "%lld" of the value, in double quotes when `fQuoted`.
+template <class Integer>
+inline void AppendInteger(ByteBuffer& out, Integer value, bool fQuoted) {
   char text[24];
   text[0] = '"';
-  size_t n = 1 + FormatU64Into(text + 1, value);
-  if (fQuoted) text[n++] = '"';
-  AppendText(out, fQuoted ? text : text + 1, fQuoted ? n : n - 1);
-}
-
-// "%lld" of the value, in double quotes when `fQuoted`.
-inline void AppendSigned(ByteBuffer& out, int64_t value, bool fQuoted) {
-  char text[24];
-  text[0] = '"';
-  size_t n = 1 + FormatS64Into(text + 1, value);
+  size_t n = 1;
+  if constexpr (std::is_signed<Integer>::value) {
+    n += FormatS64Into(text + 1, static_cast<long long>(value));
+  } else {
+    n += FormatU64Into(text + 1, static_cast<unsigned long long>(value));
+  }
   if (fQuoted) text[n++] = '"';
   AppendText(out, fQuoted ? text : text + 1, fQuoted ? n : n - 1);
 }
