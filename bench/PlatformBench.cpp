@@ -3,8 +3,10 @@
 // Small blocks are 16..512 bytes drawn from a fixed sequence, so the pool and malloc see the
 // same sizes in the same order. "Pair" frees each block right after allocating it; "Ring"
 // keeps 256 blocks alive and replaces one per iteration, which exercises free lists holding
-// blocks of many sizes. The two-thread runs share one pool (the hard case for a pool: both
-// threads take and return blocks in it); malloc gets per-thread caches from the C library.
+// blocks of many sizes. With two threads, Pool* gives each thread its own pool, SharedPool*
+// makes both use one pool (the hard case: only one thread is the pool's owner, the other goes
+// through its lock), and HandOff frees on one thread what the other allocated; malloc has
+// per-thread caches of its own in every case.
 #include <benchmark/benchmark.h>
 
 #include <atomic>
