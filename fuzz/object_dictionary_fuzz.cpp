@@ -8,8 +8,7 @@
 // on reading; an accepted object holds one only when a required field was missing at version 0.
 // And since JSON text never turns a backslash-u escape back into its byte, a control byte inside
 // a value parsed from text (a currency code, say) does not survive: such a text must read back to
-// one that is then stable. Types with a field named "type" are only converted, not read back:
-// that field and the type name share one member name in every text form.
+// one that is then stable.
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
@@ -38,14 +37,6 @@ const std::vector<const StructInfo*>& KnownTypes() {
 }
 
 std::string Text(const VekString& s) { return std::string(s.Utf8(), s.NByte()); }
-
-bool HasTypeField(const StructInfo* info) {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const FieldInfo& field = info->vFieldInfo[n];
-    if (field.arity != SARN_ARITY_NONE && std::strcmp(FieldName(info, field), "type") == 0) return true;
-  }
-  return false;
-}
 
 bool HoldsUnnamedValue(const std::string& json) {
   return json.find("\"INVALID_VALUE:") != std::string::npos || json.find("\"XXX\"") != std::string::npos;
@@ -80,7 +71,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     }
     DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
     ref<SarnObject> object;
-    if (converter.DictionaryToSarnObject(tree, version, object, error) && !HasTypeField(object->GetStructInfo())) {
+    if (converter.DictionaryToSarnObject(tree, version, object, error)) {
       JsonSarnObject json(&pool);
       std::string text = Text(json.SarnObjectToJson(object.Get(), version));
       ref<SarnObject> again = Read(&pool, text, 0);

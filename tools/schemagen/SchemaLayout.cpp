@@ -266,6 +266,11 @@ class Resolver {
       if (!IsIdentifier(field.name, true)) {
         Error(field.line, "field name '" + field.name + "' is not an identifier starting with a lower-case letter");
       }
+      // Every text form of an object carries its type name under the key "type", so a field of
+      // that name would be written twice and read back as the type name.
+      if (field.name == "type") {
+        Error(field.line, "field name 'type' is reserved for the type name in the text forms");
+      }
       auto sameName = names.find(field.name);
       if (sameName != names.end()) {
         Error(field.line, "duplicate field name '" + field.name + "' in type '" + type.name + "' (also at line " +
