@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "sarn/RpcV2Parser.h"
+#include "sarn/rpc/RpcV2Parser.h"
 
 namespace {
 

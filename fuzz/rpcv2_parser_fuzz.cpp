@@ -7,7 +7,7 @@
 #include <cstring>
 #include <string>
 
-#include "sarn/RpcV2Parser.h"
+#include "sarn/rpc/RpcV2Parser.h"
 
 namespace {
 

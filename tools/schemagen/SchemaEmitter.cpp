@@ -139,7 +139,7 @@ class Emitter {
   std::string ClassHeader(const Type& type) {
     std::ostringstream out;
     out << kBanner << "// Schema type '" << type.name << "' (id " << type.id << ").\n#pragma once\n\n"
-        << "#include \"sarn/GeneratedSupport.h\"\n\nnamespace sarnschema {\n\n"
+        << "#include \"sarn/objects/GeneratedSupport.h\"\n\nnamespace sarnschema {\n\n"
         << "class SARN_EXPORT " << type.className << " : public ::sarn::SarnObject {\n public:\n"
         << "  static constexpr uint32_t TYPE_ID = " << type.id << ";\n"
         << "  " << type.className << "();\n"
@@ -176,7 +176,7 @@ class Emitter {
 
   std::string TypesUnit(size_t begin, size_t end) {
     std::ostringstream out;
-    out << kBanner << "#include <cstddef>\n\n#include \"sarn/GeneratedSupport.h\"\n";
+    out << kBanner << "#include <cstddef>\n\n#include \"sarn/objects/GeneratedSupport.h\"\n";
     for (size_t i = begin; i < end; ++i) out << "#include \"schema/" << schemaM.types[i].className << ".h\"\n";
     out << "\n// The layout checks below compare the generator's offsets with the compiler's.\n"
         << "#pragma GCC diagnostic ignored \"-Winvalid-offsetof\"\n\nnamespace sarnschema {\n";
@@ -258,7 +258,7 @@ class Emitter {
   std::string Registry() {
     std::ostringstream out;
     out << kBanner << "// The registry tables: types by id and by name, and the version range.\n"
-        << "#include \"sarn/GeneratedSupport.h\"\n#include \"schema/sarn-schema.h\"\n\nnamespace sarn {\n\n";
+        << "#include \"sarn/objects/GeneratedSupport.h\"\n#include \"schema/sarn-schema.h\"\n\nnamespace sarn {\n\n";
     std::vector<int> byId(schemaM.nStructDef, -1);
     for (size_t i = 0; i < schemaM.types.size(); ++i) byId[schemaM.types[i].id] = static_cast<int>(i);
     auto slot = [this](int index) {
@@ -282,7 +282,7 @@ class Emitter {
   std::string Enums() {
     std::ostringstream out;
     out << kBanner << "// The enum definitions: names by number, enums by id.\n"
-        << "#include \"sarn/Schema.h\"\n\nnamespace sarn {\nnamespace {\n";
+        << "#include \"sarn/model/Schema.h\"\n\nnamespace sarn {\nnamespace {\n";
     std::vector<int> byId(schemaM.nEnumDef, -1);
     for (size_t i = 0; i < schemaM.enums.size(); ++i) {
       const Enum& e = schemaM.enums[i];

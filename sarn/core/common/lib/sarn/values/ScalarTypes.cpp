@@ -1,0 +1,147 @@
+// Text forms of the scalar value types. Dates and times go through the C library's UTC
+// functions only (strptime, timegm, gmtime_r, strftime), none of which reads the process time
+// zone for the "%F" and "%T" forms used here.
+#include "sarn/values/ScalarTypes.h"
+
+#include <sys/time.h>
+
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+
+#include "sarn/base/internal/NumberText.h"
+
+namespace sarn {
+
+const ChannelNumber ChannelNumber::INVALID(-2, -2);
+const Currency Currency::INVALID;
+const Date Date::ZERO;
+const Time Time::ZERO;
+const DateTime DateTime::ZERO;
+
+namespace {
+
+constexpr long long kSecondsPerDay = 86400;
+
+bool IsDigit(char c) { return c >= '0' && c <= '9'; }
+
+// The end of the text's bytes: every parser must consume the text up to here, so an inner NUL
+// is trailing garbage rather than an early end.
+const char* EndOf(const VekString& text) { return text.Utf8() + text.NByte(); }
+
+int32_t Cut32(long value) { return static_cast<int32_t>(static_cast<uint32_t>(static_cast<unsigned long>(value))); }
+
+// strptime of the whole text; false when the format does not match or text is left over.
+bool ParseWhole(const VekString& text, const char* format, struct tm& tm) {
+  const char* end = strptime(text.Utf8(), format, &tm);
+  return end != nullptr && end == EndOf(text);
+}
+
+VekString FormatUtc(long long seconds, const char* format) {
+  time_t t = static_cast<time_t>(seconds);
+  struct tm tm;
+  if (gmtime_r(&t, &tm) == nullptr) return VekString();
+  char text[50];
+  size_t n = strftime(text, sizeof text, format, &tm);
+  return VekString::FromUtf8Bytes(nullptr, n, text);
+}
+
+}  // namespace
+
+ChannelNumber ChannelNumber::Parse(const VekString& text) {
+  const char* p = text.Utf8();
+  if (!IsDigit(*p)) return INVALID;
+  char* end;
+  long major = std::strtol(p, &end, 10);
+  if (end == EndOf(text)) return ChannelNumber(Cut32(major), -2);
+  if (*end != '-' || !IsDigit(end[1])) return INVALID;
+  long minor = std::strtol(end + 1, &end, 10);
+  if (end != EndOf(text)) return INVALID;
+  return ChannelNumber(Cut32(major), Cut32(minor));
+}
+
+VekString ChannelNumber::ToString() const {
+  if (majorM == -2 && minorM == -2) return VekString("invalid");
+  char text[32];
+  size_t n = internal::FormatS64Into(text, majorM);
+  if (majorM == -2 || minorM != -2) {
+    text[n++] = '-';
+    n += internal::FormatS64Into(text + n, minorM);
+  }
+  return VekString::FromUtf8Bytes(nullptr, n, text);
+}
+
+void Currency::Init(int amount, const char* code) {
+  if (code == nullptr || std::strlen(code) != 3) {
+    amountM = 0;
+    std::memset(codeM, 0, sizeof codeM);
+    return;
+  }
+  amountM = amount;
+  std::memcpy(codeM, code, sizeof codeM);
+}
+
+Currency Currency::Parse(const VekString& text) {
+  const char* p = text.Utf8();
+  if (text.NByte() < 5 || p[3] != '.' || !IsDigit(p[4])) return INVALID;
+  char* end;
+  long amount = std::strtol(p + 4, &end, 10);
+  // An amount that does not fit the 32-bit member is refused rather than cut.
+  if (end != EndOf(text) || amount > INT_MAX) return INVALID;
+  char code[4] = {p[0], p[1], p[2], '\0'};
+  return Currency(static_cast<int>(amount), code);
+}
+
+VekString Currency::ToString() const {
+  if (codeM[0] == '\0') return VekString("invalid");
+  // The code is read within its 4 bytes even if a caller filled all of them.
+  const void* nul = std::memchr(codeM, '\0', sizeof codeM);
+  size_t n = nul != nullptr ? static_cast<size_t>(static_cast<const char*>(nul) - codeM) : sizeof codeM;
+  char text[32];
+  std::memcpy(text, codeM, n);
+  text[n++] = '.';
+  n += internal::FormatS64Into(text + n, amountM);
+  return VekString::FromUtf8Bytes(nullptr, n, text);
+}
+
+bool Currency::operator==(const Currency& other) const {
+  return amountM == other.amountM && std::memcmp(codeM, other.codeM, sizeof codeM) == 0;
+}
+
+Date Date::Parse(const VekString& text) {
+  struct tm tm = {};
+  if (!ParseWhole(text, "%F", tm)) return ZERO;
+  return Date(static_cast<int32_t>(timegm(&tm) / kSecondsPerDay));
+}
+
+VekString Date::ToString() const { return FormatUtc(daysM * kSecondsPerDay, "%F"); }
+
+Time Time::Parse(const VekString& text) {
+  time_t epoch = 0;
+  struct tm tm;
+  gmtime_r(&epoch, &tm);
+  if (!ParseWhole(text, "%T", tm)) return ZERO;
+  return Time(static_cast<int32_t>(timegm(&tm) * 1000));
+}
+
+VekString Time::ToString() const { return FormatUtc(millisecondsM / 1000, "%T"); }
+
+DateTime DateTime::Parse(const VekString& text) {
+  struct tm tm = {};
+  if (!ParseWhole(text, "%F %T", tm)) {
+    tm = {};
+    if (!ParseWhole(text, "%FT%T", tm)) return ZERO;
+  }
+  return DateTime(static_cast<int64_t>(timegm(&tm)) * 1000);
+}
+
+VekString DateTime::ToString() const { return FormatUtc(millisecondsM / 1000, "%F %T"); }
+
+DateTime DateTime::Now() {
+  struct timeval now;
+  gettimeofday(&now, nullptr);
+  return DateTime(static_cast<int64_t>(now.tv_sec) * 1000 + now.tv_usec / 1000);
+}
+
+}  // namespace sarn
