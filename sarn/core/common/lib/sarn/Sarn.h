@@ -20,6 +20,7 @@
 #include "sarn/values/Base64.h"
 #include "sarn/values/ByteBuffer.h"
 #include "sarn/values/Json.h"
+#include "sarn/values/LongId.h"
 #include "sarn/values/ObjectIdAndType.h"
 #include "sarn/values/SarnUtil.h"
 #include "sarn/values/ScalarTypes.h"

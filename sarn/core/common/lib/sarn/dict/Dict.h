@@ -13,6 +13,7 @@
 #pragma once
 
 #include "sarn/dict/Dictionary.h"
+#include "sarn/values/LongId.h"
 #include "sarn/base/Export.h"
 #include "vek/VekByteString.h"
 #include "vek/VekCore.h"
@@ -30,15 +31,6 @@ enum Type {
   TYPE_NONE = 2,    // nothing there, or a NullValue or an ArrayValue
 };
 }  // namespace dictvalue
-
-struct LongIdPrefix {
-  const char* pPrefixM;
-  unsigned int codeM;  // the top 16 bits of the identifier
-};
-// rs 1, ts 2, bs 3, tms.ep 5, tms.sh 6, tms.mv 7, tms.sp 8, vp 9, dlna 10, vod 16384; searched
-// in this order.
-constexpr int nLongIdPrefixesG = 10;
-SARN_EXPORT extern const LongIdPrefix longIdPrefixesG[nLongIdPrefixesG];
 
 class SARN_EXPORT Dict : public VekCore {
  public:

@@ -9,18 +9,11 @@
 #include "sarn/values/Base64.h"
 #include "sarn/dict/Dict.h"
 #include "sarn/base/internal/NumberText.h"
+#include "sarn/values/internal/LongIdText.h"
 
 namespace sarn {
 
-const LongIdPrefix longIdPrefixesG[nLongIdPrefixesG] = {
-    {"rs", 1},     {"ts", 2},     {"bs", 3}, {"tms.ep", 5}, {"tms.sh", 6},
-    {"tms.mv", 7}, {"tms.sp", 8}, {"vp", 9}, {"dlna", 10},  {"vod", 16384},
-};
-
 namespace {
-
-constexpr int kIdShift = 48;
-constexpr unsigned long long kIdNumberMask = (1ull << kIdShift) - 1;
 
 VekString Text(const char* data, size_t n) { return VekString::FromUtf8Bytes(nullptr, n, data); }
 
@@ -56,21 +49,8 @@ VekString Dict::FormatFloat(VekMempool* pool, double value) {
 }
 
 VekString Dict::FormatLongId(VekMempool* pool, unsigned long long id) {
-  char text[48];
-  unsigned int code = static_cast<unsigned int>(id >> kIdShift);
-  if (code == 0) return Text(text, internal::FormatU64Into(text, id));
-  const char* prefix = "xxx";
-  for (const LongIdPrefix& row : longIdPrefixesG) {
-    if (row.codeM == code) {
-      prefix = row.pPrefixM;
-      break;
-    }
-  }
-  size_t n = std::strlen(prefix);
-  std::memcpy(text, prefix, n);
-  text[n++] = '.';
-  n += internal::FormatU64Into(text + n, id & kIdNumberMask);
-  return Text(text, n);
+  char text[internal::kLongIdTextRoom];
+  return Text(text, internal::FormatLongIdInto(text, id));
 }
 
 VekString Dict::FormatBytestring(VekMempool* pool, const ref<vek::ByteBuffer>& bytes) { return EncodeBase64(pool, bytes); }
@@ -126,12 +106,9 @@ unsigned long long Dict::ParseLongId(VekMempool* pool, const char* text) {
   if (dot == nullptr) return ParseU64(pool, text);
   size_t prefixLength = static_cast<size_t>(dot - text);
   unsigned long long number = ParseU64(pool, dot + 1);
-  for (const LongIdPrefix& row : longIdPrefixesG) {
-    if (std::strlen(row.pPrefixM) == prefixLength && std::memcmp(row.pPrefixM, text, prefixLength) == 0) {
-      return number + (static_cast<unsigned long long>(row.codeM) << kIdShift);
-    }
-  }
-  return 0;
+  unsigned int code = 0;
+  if (!internal::FindLongIdCode(text, prefixLength, code)) return 0;
+  return number + (static_cast<unsigned long long>(code) << internal::kLongIdShift);
 }
 
 ref<vek::ByteBuffer> Dict::ParseBytestring(VekMempool* pool, const VekString& text) { return DecodeBase64(pool, text); }

@@ -8,7 +8,7 @@
 
 #include "sarn/dict/Dict.h"
 #include "sarn/model/FieldAccess.h"
-#include "sarn/base/internal/NumberText.h"
+#include "sarn/values/internal/LongIdText.h"
 
 namespace sarn {
 namespace internal {
@@ -24,21 +24,8 @@ void Put(char (&text)[kIdTextRoom], size_t& length, const char* bytes, size_t n)
 }
 
 void PutLongId(char (&text)[kIdTextRoom], size_t& length, uint64_t id) {
-  char digits[24];
-  unsigned code = static_cast<unsigned>(id >> 48);
-  if (code != 0) {
-    const char* prefix = "xxx";
-    for (int row = 0; row < nLongIdPrefixesG; ++row) {
-      if (longIdPrefixesG[row].codeM == code) {
-        prefix = longIdPrefixesG[row].pPrefixM;
-        break;
-      }
-    }
-    Put(text, length, prefix, std::strlen(prefix));
-    Put(text, length, ".", 1);
-    id &= (1ull << 48) - 1;
-  }
-  Put(text, length, digits, FormatU64Into(digits, id));
+  char digits[kLongIdTextRoom];
+  Put(text, length, digits, FormatLongIdInto(digits, id));
 }
 
 }  // namespace

@@ -1,17 +1,13 @@
 #include "sarn/values/SarnUtil.h"
 
-#include "sarn/dict/Dict.h"
 #include "sarn/model/Schema.h"
+#include "sarn/values/internal/LongIdText.h"
 
 namespace sarn {
 
 const char* SarnUtil::GetNamespaceForId(unsigned long long id) {
-  unsigned int code = static_cast<unsigned int>(id >> 48);
-  if (code == 0) return nullptr;
-  for (const LongIdPrefix& row : longIdPrefixesG) {
-    if (row.codeM == code) return row.pPrefixM;
-  }
-  return nullptr;
+  unsigned int code = static_cast<unsigned int>(id >> internal::kLongIdShift);
+  return code == 0 ? nullptr : internal::FindLongIdPrefix(code);
 }
 
 bool SarnUtil::EnumNameToNumber(int enumId, const VekString& name, unsigned int& number) {

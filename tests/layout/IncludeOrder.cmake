@@ -1,0 +1,26 @@
+cmake_minimum_required(VERSION 3.25)
+# Fails when a runtime file includes a folder that comes later in the order below, so that each
+# folder can be read knowing only the folders before it. The lazy payload is the one allowed
+# cycle: it holds bodies in any form and converts them on demand through the later folders.
+set(order base model values dict objects json rpc)
+set(allowed "dict/LazyDict.cpp")
+file(GLOB_RECURSE files RELATIVE ${ROOT} ${ROOT}/*.h ${ROOT}/*.cpp)
+set(failures "")
+foreach(file IN LISTS files)
+  string(REGEX MATCH "^[^/]+" folder ${file})
+  list(FIND order ${folder} own)
+  if(own EQUAL -1 OR file IN_LIST allowed)
+    continue()  # Sarn.h at the top includes everything
+  endif()
+  file(STRINGS ${ROOT}/${file} includes REGEX "^#include \"sarn/[^/]+/")
+  foreach(line IN LISTS includes)
+    string(REGEX REPLACE "^#include \"sarn/([^/]+)/.*" "\\1" target "${line}")
+    list(FIND order ${target} theirs)
+    if(theirs EQUAL -1 OR theirs GREATER own)
+      string(APPEND failures "\n  ${file}: ${line}")
+    endif()
+  endforeach()
+endforeach()
+if(failures)
+  message(FATAL_ERROR "includes against the folder order (${order}):${failures}")
+endif()
