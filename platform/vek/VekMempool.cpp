@@ -180,7 +180,15 @@ void VekMempool::FreeSmall(void* p, size_t nByte) {
   std::free(HeaderOf(p));
 }
 
+bool VekMempool::IsFailingForTest() {
+  long n = failCountdownM.load(std::memory_order_relaxed);
+  while (n >= 0 && !failCountdownM.compare_exchange_weak(n, n - 1, std::memory_order_relaxed)) {
+  }
+  return n == 0;
+}
+
 void* VekMempool::Malloc(size_t nByte) {
+  if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
   if (nByte <= kMaxSmallBlock) return MallocSmall(nByte);
   if (nByte > SIZE_MAX - sizeof(BlockHeader)) return nullptr;
   char* raw = static_cast<char*>(std::malloc(sizeof(BlockHeader) + nByte));
@@ -206,6 +214,7 @@ void* VekMempool::Calloc(size_t count, size_t size) {
 
 void* VekMempool::Realloc(void* p, size_t nByte) {
   if (p == nullptr) return Malloc(nByte);
+  if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
   size_t old = HeaderOf(p)->nByteM;
   // Stay in place while the block's size class still fits.
   if (old <= kMaxSmallBlock && nByte <= kMaxSmallBlock && ClassOf(old) == ClassOf(nByte)) {

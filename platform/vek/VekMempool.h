@@ -58,6 +58,13 @@ class VekMempool {
   // The size the caller asked for when the block was allocated.
   static size_t SizeOf(const void* p);
 
+  // Test hook: after `n` more allocations succeed (Malloc, Calloc, Realloc), the next one fails
+  // and returns null, once; the hook is then off again. A negative `n` switches it off. With a
+  // large `n`, what GetFailCountdown lost over a run is the number of allocations the run made,
+  // so a test can fail each of them in turn.
+  void FailAllocationAfter(long n) { failCountdownM.store(n, std::memory_order_relaxed); }
+  long GetFailCountdown() const { return failCountdownM.load(std::memory_order_relaxed); }
+
   static constexpr size_t kMaxSmallBlock = 512;
   static constexpr size_t kClassGranularity = 16;
   static constexpr size_t kNumClasses = kMaxSmallBlock / kClassGranularity;
@@ -68,6 +75,7 @@ class VekMempool {
     FreeNode* pNextM;
   };
   bool IsOwnerThread() const;
+  bool IsFailingForTest();
   void* MallocSmall(size_t nByte);
   void FreeSmall(void* p, size_t nByte);
   // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the count
@@ -77,6 +85,7 @@ class VekMempool {
 
   char nameM[64];
   const void* pOwnerM;
+  std::atomic<long> failCountdownM{-1};
 
   // The owner thread's side: lists touched by it alone; counters written by it alone (a load
   // and a store, no locked instruction) and read by anyone.
