@@ -1,8 +1,15 @@
-// Limits: the bounds that the readers of untrusted input apply, gathered in one place.
+// Limits: every bound that the library's readers and converters apply to what they are given,
+// with its default and its message, in one place.
 //
-// Each limit has a default and can be changed for one call through an options argument
-// (JsonLimits for the JSON readers); there is no process-wide setter. A limit of ours has a
-// message of its own that names it, so a refusal is never mistaken for a syntax error.
+// One value type, Limits, carries them. Every reader and converter that applies a bound takes a
+// Limits the same way: an overload with a trailing `const Limits&` argument per call, or a
+// Limits given to a converter value when it is made. There is no process-wide setter, so one
+// caller's choice never changes another's. Each refusal has a message of its own that names
+// the limit, so it is never mistaken for a syntax error.
+//
+// Running out of memory is not a limit but takes one path too: pool allocation never throws; a
+// failed allocation is a null pointer that each caller turns into its own failure, and readers
+// that have no message of their own say kOutOfMemoryMessage.
 //
 // Thread safety: plain values and constant texts.
 #pragma once
@@ -13,30 +20,36 @@
 
 namespace sarn {
 
-// Bounds of the two JSON readers (Dictionary::FromJson* and JsonParser).
-struct SARN_EXPORT JsonLimits {
-  // Nesting depth: how many containers (objects and arrays) may be open at once; the
-  // top-level object is level 1. The readers keep their open containers off the native stack,
-  // but writing and comparing a tree recurse once per level, so this bound is what keeps those
-  // walks safe for every tree a reader builds: at the default a whole read, write, compare and
-  // release fits in a 256 KiB thread stack. A document nested exactly this deep is read; one
-  // level deeper is refused with the message of kJsonDepthLimitFormat. A limit below 1 refuses
-  // every document.
+struct SARN_EXPORT Limits {
+  // Nesting depth: how many containers (JSON objects and arrays, nested Dictionary trees and
+  // objects) may be open at once; the top-level one is level 1. The readers keep their open
+  // containers off the native stack, but writing and comparing a tree recurse once per level,
+  // so this bound is what keeps those walks safe for every tree a reader builds: at the default
+  // a whole read, write, compare and release fits in a 256 KiB thread stack. A document nested
+  // exactly this deep is read; one level deeper is refused with the reader's depth message. A
+  // limit below 1 refuses every document.
   static constexpr int kDefaultMaxDepth = 512;
 
-  JsonLimits() : maxDepthM(kDefaultMaxDepth) {}
-  explicit JsonLimits(int maxDepth) : maxDepthM(maxDepth) {}
+  Limits() : maxDepthM(kDefaultMaxDepth) {}
+  explicit Limits(int maxDepth) : maxDepthM(maxDepth) {}
 
   int maxDepthM;
 };
 
-// Format of the message of a refused nesting depth; %d is the limit in force.
-SARN_EXPORT extern const char kJsonDepthLimitFormat[];  // "JSON nesting exceeds the depth limit of %d levels."
+// The name the JSON readers' interface has always used.
+typedef Limits JsonLimits;
+
+// Refused nesting depth; %d is the limit in force.
+SARN_EXPORT extern const char kJsonDepthLimitFormat[];        // "JSON nesting exceeds the depth limit of %d levels."
+SARN_EXPORT extern const char kDictionaryDepthLimitFormat[];  // "Dictionary nesting exceeds the depth limit of %d levels."
 
 // The platform arrays under ArrayValue and under one name of a Dictionary hold at most this
 // many values; a reader refuses a document that would need more rather than drop values.
 constexpr unsigned kMaxValuesPerContainer = 65535;
-SARN_EXPORT extern const char kJsonArrayLimitMessage[];  // "JSON array holds more than 65535 elements."
+SARN_EXPORT extern const char kJsonArrayLimitMessage[];        // "JSON array holds more than 65535 elements."
 SARN_EXPORT extern const char kJsonRepeatedKeyLimitMessage[];  // "JSON object repeats a key more than 65535 times."
+
+// A pool that could not serve an allocation, where the failing operation has no message of its own.
+SARN_EXPORT extern const char kOutOfMemoryMessage[];  // "Out of memory."
 
 }  // namespace sarn

@@ -21,10 +21,6 @@
 
 namespace sarn {
 
-const char kJsonDepthLimitFormat[] = "JSON nesting exceeds the depth limit of %d levels.";
-const char kJsonArrayLimitMessage[] = "JSON array holds more than 65535 elements.";
-const char kJsonRepeatedKeyLimitMessage[] = "JSON object repeats a key more than 65535 times.";
-
 namespace {
 
 using Byte = unsigned char;
