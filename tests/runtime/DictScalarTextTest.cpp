@@ -116,7 +116,8 @@ TEST(DictParseTest, SignedIntegers) {
     EXPECT_EQ(Dict::ParseS64(nullptr, Text(bad)), 0) << bad;
     EXPECT_EQ(Dict::ParseS32(nullptr, Text(bad)), 0) << bad;
   }
-  EXPECT_EQ(Dict::ParseS64(nullptr, Text(std::string("5\0" "1", 3))), 0) << "an inner NUL is text after the number";
+  EXPECT_EQ(Dict::ParseS64(nullptr, Text(std::string("5\0" "x", 3))), 5) << "the text ends at its first NUL";
+  EXPECT_TRUE(Dict::ParseBool(nullptr, Text(std::string("true\0x", 6))));
 }
 
 TEST(DictParseTest, BooleansFloatsAndBytestrings) {

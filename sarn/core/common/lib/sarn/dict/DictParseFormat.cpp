@@ -55,7 +55,9 @@ VekString Dict::FormatLongId(VekMempool* pool, unsigned long long id) {
 
 VekString Dict::FormatBytestring(VekMempool* pool, const ref<vek::ByteBuffer>& bytes) { return EncodeBase64(pool, bytes); }
 
-bool Dict::ParseBool(VekMempool* pool, const VekString& text) { return text.FEqual("true"); }
+// Parsers read their text as a C string, up to its first NUL, as the strtoll and sscanf forms that
+// define them do (ScalarTypes.cpp follows the same rule).
+bool Dict::ParseBool(VekMempool* pool, const VekString& text) { return std::strcmp(text.Utf8(), "true") == 0; }
 
 int Dict::ParseS32(VekMempool* pool, const VekString& text) {
   return static_cast<int>(static_cast<unsigned int>(static_cast<unsigned long long>(ParseS64(pool, text))));
@@ -63,7 +65,7 @@ int Dict::ParseS32(VekMempool* pool, const VekString& text) {
 
 long long Dict::ParseS64(VekMempool* pool, const VekString& text) {
   const char* p = text.Utf8();
-  const char* end = p + text.NByte();
+  const char* end = p + std::strlen(p);
   bool isNegative = p != end && *p == '-';
   if (isNegative) ++p;
   if (p == end) return 0;
@@ -72,7 +74,7 @@ long long Dict::ParseS64(VekMempool* pool, const VekString& text) {
   unsigned long long limit = isNegative ? 1ull << 63 : (1ull << 63) - 1;
   unsigned long long value = 0;
   for (; p != end; ++p) {
-    if (!IsDigit(*p)) return 0;  // a sign, space, NUL or anything after the number
+    if (!IsDigit(*p)) return 0;  // a sign, space or anything after the number
     unsigned int digit = static_cast<unsigned int>(*p - '0');
     value = value > (limit - digit) / 10 ? limit : value * 10 + digit;
   }

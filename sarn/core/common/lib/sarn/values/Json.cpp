@@ -115,18 +115,18 @@ class SinkOut {
   void Commit(const unsigned char* end) { nStagedM = static_cast<size_t>(end - stageM); }
   bool Finish() {
     Flush();
-    return fOkM;
+    return isOkM;
   }
 
  private:
   void Flush() {
-    if (nStagedM != 0) fOkM = outM.Write(reinterpret_cast<const char*>(stageM), nStagedM) && fOkM;
+    if (nStagedM != 0) isOkM = outM.Write(reinterpret_cast<const char*>(stageM), nStagedM) && isOkM;
     nStagedM = 0;
   }
   wynbaselib::Bytesink& outM;
   unsigned char stageM[2 * kSliceOutBytes + 2];
   size_t nStagedM = 0;
-  bool fOkM = true;
+  bool isOkM = true;
 };
 
 bool IsBare(const VekString& text) {
@@ -227,7 +227,7 @@ InputPointerBytesource::InputPointerBytesource(wynbaselib::Bytesource* source)
       fEchoM(false),
       pEchoStartM(bufferM),
       pEchoSinkM(nullptr),
-      fEchoFailedM(false) {}
+      wasEchoFailedM(false) {}
 
 InputPointerBytesource::InputPointerBytesource(const unsigned char* data, size_t length)
     : pSourceM(&EmptyStream()),
@@ -239,12 +239,12 @@ InputPointerBytesource::InputPointerBytesource(const unsigned char* data, size_t
       fEchoM(false),
       pEchoStartM(data),
       pEchoSinkM(nullptr),
-      fEchoFailedM(false) {}
+      wasEchoFailedM(false) {}
 
 void InputPointerBytesource::FlushEcho() {
   if (pCurM != pEchoStartM && pEchoSinkM != nullptr &&
       !pEchoSinkM->Write(reinterpret_cast<const char*>(pEchoStartM), static_cast<size_t>(pCurM - pEchoStartM))) {
-    fEchoFailedM = true;
+    wasEchoFailedM = true;
   }
   pEchoStartM = pCurM;
 }
@@ -278,13 +278,13 @@ void InputPointerBytesource::StartEcho(wynbaselib::Bytesink* sink) {
   pEchoStartM = pCurM;
   pEchoSinkM = sink;
   fEchoM = true;
-  fEchoFailedM = false;
+  wasEchoFailedM = false;
 }
 
 bool InputPointerBytesource::StopEcho() {
   if (fEchoM) FlushEcho();
   fEchoM = false;
-  return !fEchoFailedM;
+  return !wasEchoFailedM;
 }
 
 namespace Json {

@@ -83,7 +83,7 @@ struct SARN_EXPORT InputPointerBytesource {
   bool fEchoM;                  // consumed bytes are copied to pEchoSinkM
   const unsigned char* pEchoStartM;  // first byte of the block not yet echoed
   wynbaselib::Bytesink* pEchoSinkM;
-  bool fEchoFailedM;            // a Write to the echo sink returned false
+  bool wasEchoFailedM;            // a Write to the echo sink returned false
 
  private:
   void FlushEcho();

@@ -26,9 +26,9 @@ constexpr long long kSecondsPerDay = 86400;
 
 bool IsDigit(char c) { return c >= '0' && c <= '9'; }
 
-// The end of the text's bytes: every parser must consume the text up to here, so an inner NUL
-// is trailing garbage rather than an early end.
-const char* EndOf(const VekString& text) { return text.Utf8() + text.NByte(); }
+// Scalar texts are C strings, here as in the Dict::Parse* family: a parser reads up to the first
+// NUL, as the strtol and strptime forms it is built on do, and whatever follows a NUL is not seen.
+const char* EndOf(const VekString& text) { return text.Utf8() + std::strlen(text.Utf8()); }
 
 int32_t Cut32(long value) { return static_cast<int32_t>(static_cast<uint32_t>(static_cast<unsigned long>(value))); }
 
@@ -84,7 +84,7 @@ void Currency::Init(int amount, const char* code) {
 
 Currency Currency::Parse(const VekString& text) {
   const char* p = text.Utf8();
-  if (text.NByte() < 5 || p[3] != '.' || !IsDigit(p[4])) return INVALID;
+  if (std::strlen(p) < 5 || p[3] != '.' || !IsDigit(p[4])) return INVALID;
   char* end;
   long amount = std::strtol(p + 4, &end, 10);
   // An amount that does not fit the 32-bit member is refused rather than cut.
