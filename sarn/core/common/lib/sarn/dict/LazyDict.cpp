@@ -101,7 +101,7 @@ ref<LazyDict> LazyDict::FromDictionary(VekMempool* pool, const ref<Dictionary>& 
 void LazyDict::SetDictionary(const ref<Dictionary>& dictionary) { dictionaryM = dictionary; }
 
 bool LazyDict::GetType(unsigned int* typeId) {
-  // Type ids are looked up by the object layer; until it is here no form has one.
+  // This layer does not look type names up in the registry, so no form has an id here.
   (void)typeId;
   return false;
 }

@@ -4,9 +4,9 @@
 //
 // Forms (repM): a Dict, JSON text, protocol-buffer bytes, a schema object, a Dictionary, or an
 // unread byte source. Conversions hand their result to the caller and keep nothing, so asking
-// twice converts twice. This file serves the Dict, JSON and Dictionary forms; the object,
-// protocol-buffer and byte-source forms are held (and the source destroyed) but converted by a
-// later layer, and until then they are answered like an unknown form: a null Dictionary with
+// twice converts twice. The Dict, JSON and Dictionary forms convert to one another. The object,
+// protocol-buffer and byte-source forms are held (the source is deleted with the payload) but
+// not converted: they are answered like an unknown form, with a null Dictionary and
 // "LazyDict to Dictionary: unknown representation in LazyDict", an "error" Dict with the code
 // "internalError" and the text "bad rep in LazyDict", no JSON output, false from type queries.
 //
@@ -63,8 +63,8 @@ class SARN_EXPORT LazyDict : public VekCore {
   static ref<LazyDict> FromBytesource(VekMempool* pool, wynbaselib::Bytesource* source, KernoVersion version);
   static ref<LazyDict> FromDictionary(VekMempool* pool, const ref<Dictionary>& dictionary, KernoVersion version);
 
-  // The payload's schema type id; type ids come with the object conversions, so for now every
-  // form answers false.
+  // The payload's schema type id: every form answers false and leaves `typeId` alone, since this
+  // layer does not look types up by name.
   bool GetType(unsigned int* typeId);
   // The text of the payload's "type" (empty when it is not a string); false when there is none.
   // Stored JSON is parsed again on every call.
