@@ -1,6 +1,6 @@
 // sarn: the client library of the Kerno service. Include this one header for everything.
 // The runtime's folders, in the order in which they may include each other: base, model,
-// values, dict, objects, json, rpc.
+// values, dict, objects, json, binary, rpc.
 #pragma once
 
 #include "vek/Vek.h"
@@ -36,6 +36,9 @@
 
 #include "sarn/json/JsonParser.h"
 #include "sarn/json/JsonSarnObject.h"
+
+#include "sarn/binary/GoogleInt.h"
+#include "sarn/binary/ProtoBufByteOutputStream.h"
 
 #include "sarn/rpc/RpcV2Parser.h"
 

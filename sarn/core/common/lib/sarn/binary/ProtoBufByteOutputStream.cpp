@@ -1,0 +1,137 @@
+#include "sarn/binary/ProtoBufByteOutputStream.h"
+
+#include <cstdlib>
+#include <cstring>
+#include <initializer_list>
+
+namespace sarn {
+
+namespace {
+
+// A frame per open nested section during Finish: where its content ended (`write` when its end
+// marker was met) and the insertions counted by the enclosing level so far.
+struct OpenSection {
+  size_t endM;
+  size_t insertedM;
+};
+
+}  // namespace
+
+ProtoBufByteOutputStream::~ProtoBufByteOutputStream() { std::free(bytesM.pDataM); }
+
+bool ProtoBufByteOutputStream::Grow() {
+  if (bytesM.isOutOfMemoryM) return false;
+  size_t capacity = bytesM.nCapacityM == 0 ? 1 : bytesM.nCapacityM * 2;
+  void* data = capacity > bytesM.nCapacityM ? std::realloc(bytesM.pDataM, capacity) : nullptr;
+  if (data == nullptr) {
+    bytesM.isOutOfMemoryM = true;
+    return false;
+  }
+  bytesM.pDataM = static_cast<unsigned char*>(data);
+  bytesM.nCapacityM = capacity;
+  return true;
+}
+
+void ProtoBufByteOutputStream::WriteBytes(const unsigned char* data, unsigned long length) {
+  for (unsigned long i = 0; i < length; ++i) WriteByte(data[i]);
+}
+
+void ProtoBufByteOutputStream::WriteString(const VekString& text) {
+  StartSection();
+  WriteBytes(reinterpret_cast<const unsigned char*>(text.Utf8()), text.NByte());
+  EndSection();
+}
+
+void ProtoBufByteOutputStream::Finish(const unsigned char*& data, unsigned long& length) {
+  size_t read = bytesM.nSizeM;
+  size_t write = bytesM.nSizeM;
+  if (!bytesM.isOutOfMemoryM) FinishOneSection(read, write);
+  if (bytesM.isOutOfMemoryM) {
+    data = nullptr;
+    length = 0;
+    return;
+  }
+  data = bytesM.pDataM + write;
+  length = bytesM.nSizeM - write;
+}
+
+size_t ProtoBufByteOutputStream::FinishOneSection(size_t& read, size_t& write) {
+  OpenSection* stack = nullptr;
+  size_t depth = 0;
+  size_t capacity = 0;
+  size_t inserted = 0;
+  unsigned char* bytes = bytesM.pDataM;
+  for (;;) {
+    bool isSectionStart = false;
+    if (read == 0) {
+      if (depth == 0) break;
+      isSectionStart = true;  // an end marker without its start: close the section here
+    } else {
+      unsigned char b = bytes[--read];
+      if (b != kMarker || read == 0) {
+        bytes[--write] = b;
+        continue;
+      }
+      unsigned char code = bytes[--read];
+      if (code == 0x02) {
+        if (depth == capacity) {
+          size_t grown = capacity == 0 ? 16 : capacity * 2;
+          void* more = std::realloc(stack, grown * sizeof *stack);
+          if (more == nullptr) {
+            bytesM.isOutOfMemoryM = true;
+            break;
+          }
+          stack = static_cast<OpenSection*>(more);
+          capacity = grown;
+        }
+        stack[depth++] = OpenSection{write, inserted};
+        inserted = 0;
+        continue;
+      }
+      if (code != 0x01) {
+        bytes[--write] = kMarker;  // an escaped data byte
+        continue;
+      }
+      if (depth == 0) continue;  // a start without an end: dropped, the pass goes on
+      isSectionStart = true;
+    }
+    if (isSectionStart) {
+      // The content lies between `write` and where it ended; every byte inserted inside it moved
+      // that end up by one.
+      OpenSection open = stack[--depth];
+      size_t length = inserted + (open.endM - write);
+      size_t added = InsertLength(static_cast<unsigned int>(length), read, write);
+      inserted = open.insertedM + inserted + added;
+      bytes = bytesM.pDataM;  // an insertion may have moved the buffer
+      if (bytesM.isOutOfMemoryM) break;
+    }
+  }
+  std::free(stack);
+  return inserted;
+}
+
+size_t ProtoBufByteOutputStream::InsertLength(unsigned int length, size_t& read, size_t& write) {
+  size_t inserted = 0;
+  bool isFirst = true;
+  for (unsigned shift : {28u, 21u, 14u, 7u}) {
+    unsigned int group = length >> shift;
+    if (group == 0) continue;
+    inserted += InsertByte(static_cast<unsigned char>((group & 0x7F) | (isFirst ? 0 : 0x80)), read, write);
+    isFirst = false;
+  }
+  return inserted + InsertByte(static_cast<unsigned char>((length & 0x7F) | (isFirst ? 0 : 0x80)), read, write);
+}
+
+size_t ProtoBufByteOutputStream::InsertByte(unsigned char b, size_t& read, size_t& write) {
+  if (write > read) {
+    bytesM.pDataM[--write] = b;
+    return 0;
+  }
+  if (bytesM.nSizeM == bytesM.nCapacityM && !Grow()) return 0;
+  std::memmove(bytesM.pDataM + write + 1, bytesM.pDataM + write, bytesM.nSizeM - write);
+  bytesM.pDataM[write] = b;
+  ++bytesM.nSizeM;
+  return 1;
+}
+
+}  // namespace sarn

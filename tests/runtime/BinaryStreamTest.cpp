@@ -1,0 +1,186 @@
+// Varints and the sectioned output stream: exact bytes of writers and of Finish, readers at their
+// boundaries, and Finish against a plain length-prefix encoder on random section trees.
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <random>
+#include <string>
+
+#include "sarn/Sarn.h"
+
+using sarn::GoogleInt;
+using sarn::ProtoBufByteOutputStream;
+
+namespace {
+
+std::string Finished(ProtoBufByteOutputStream& stream) {
+  const unsigned char* data;
+  unsigned long length;
+  stream.Finish(data, length);
+  return std::string(reinterpret_cast<const char*>(data), length);
+}
+
+std::string Written(const std::function<void(ProtoBufByteOutputStream*)>& write) {
+  ProtoBufByteOutputStream stream;
+  write(&stream);
+  return Finished(stream);
+}
+
+// "[" opens a section, "]" closes it, "x" writes the byte 0x64, any other character itself.
+std::string FinishedScript(const std::string& script) {
+  ProtoBufByteOutputStream stream;
+  for (char c : script) {
+    if (c == '[') stream.StartSection();
+    else if (c == ']') stream.EndSection();
+    else stream.WriteByte(c == 'x' ? 0x64 : static_cast<unsigned char>(c));
+  }
+  return Finished(stream);
+}
+
+}  // namespace
+
+TEST(GoogleIntTest, WritersGiveExactBytes) {
+  using S = ProtoBufByteOutputStream;
+  struct Case {
+    std::function<void(S*)> write;
+    std::string bytes;
+  } cases[] = {
+      {[](S* s) { GoogleInt::WriteGoogleU32(0, s); }, std::string(1, '\0')},
+      {[](S* s) { GoogleInt::WriteGoogleU32(127, s); }, "\x7F"},
+      {[](S* s) { GoogleInt::WriteGoogleU32(128, s); }, "\x80\x01"},
+      {[](S* s) { GoogleInt::WriteGoogleU32(300, s); }, "\xAC\x02"},
+      {[](S* s) { GoogleInt::WriteGoogleU32(100, s); }, "d"},  // 0x64 as data survives its escape
+      {[](S* s) { GoogleInt::WriteGoogleU32(0xFFFFFFFF, s); }, "\xFF\xFF\xFF\xFF\x0F"},
+      {[](S* s) { GoogleInt::WriteGoogleU64(~0ull, s); }, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+      {[](S* s) { GoogleInt::WriteGoogleS32(-1, s); }, "\x01"},
+      {[](S* s) { GoogleInt::WriteGoogleS32(1, s); }, "\x02"},
+      {[](S* s) { GoogleInt::WriteGoogleS32(-2147483647 - 1, s); }, "\xFF\xFF\xFF\xFF\x0F"},
+      {[](S* s) { GoogleInt::WriteGoogleS64(-1 - 0x7FFFFFFFFFFFFFFFll, s); }, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+      {[](S* s) { GoogleInt::WriteGoogleS64(0x7FFFFFFFFFFFFFFFll, s); }, "\xFE\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+  };
+  for (const Case& c : cases) EXPECT_EQ(Written(c.write), c.bytes) << testing::PrintToString(c.bytes);
+}
+
+TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
+  struct Case {
+    std::string bytes;
+    bool isOk32;
+    unsigned long long value32;
+    bool isOk64;
+    unsigned long long value64;
+    size_t consumed;  // on success, both widths
+  } cases[] = {
+      {"\x05rest", true, 5, true, 5, 1},
+      {"\xAC\x02", true, 300, true, 300, 2},
+      {"\xFF\xFF\xFF\xFF\x7F", true, 0xFFFFFFFF, true, 0x7FFFFFFFFull, 5},  // surplus bits dropped at 32
+      {"\x80\x80\x80\x80\x80\x01", false, 0, true, 1ull << 35, 6},          // six bytes: too long for 32
+      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", false, 0, true, ~0ull, 10},
+      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", false, 0, false, 0, 0},  // eleven bytes
+      {"\x80", false, 0, false, 0, 0},                                          // truncated
+      {"", false, 0, false, 0, 0},
+  };
+  for (const Case& c : cases) {
+    const unsigned char* start = reinterpret_cast<const unsigned char*>(c.bytes.data());
+    const unsigned char* end = start + c.bytes.size();
+    const unsigned char* cursor = start;
+    unsigned int value32 = 77;
+    EXPECT_EQ(GoogleInt::ReadGoogleU32(&cursor, end, &value32), c.isOk32) << testing::PrintToString(c.bytes);
+    EXPECT_EQ(value32, c.isOk32 ? c.value32 : 77);
+    EXPECT_EQ(cursor, start + (c.isOk32 ? c.consumed : 0));
+    cursor = start;
+    unsigned long long value64 = 77;
+    EXPECT_EQ(GoogleInt::ReadGoogleU64(&cursor, end, &value64), c.isOk64) << testing::PrintToString(c.bytes);
+    EXPECT_EQ(value64, c.isOk64 ? c.value64 : 77);
+    EXPECT_EQ(cursor, start + (c.isOk64 ? c.consumed : 0));
+  }
+  // Zig-zag undone: even u is u / 2, odd u is ~(u >> 1).
+  const unsigned char signedBytes[] = {0x03, 0x04, 0xFF, 0xFF, 0xFF, 0xFF, 0x0F};
+  const unsigned char* cursor = signedBytes;
+  int s32 = 0;
+  long long s64 = 0;
+  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2);
+  EXPECT_TRUE(GoogleInt::ReadGoogleS64(&cursor, signedBytes + 7, &s64) && s64 == 2);
+  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2147483647 - 1);
+}
+
+TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
+  struct Case {
+    const char* script;
+    std::string bytes;
+  } cases[] = {
+      {"x", "d"},
+      {"[\x01]", "\x01\x01"},
+      {"[]", std::string(1, '\0')},
+      {"[[x]]", "\x02\x01" "d"},
+      {"\x01x\x02x", "\x01" "d\x02" "d"},  // marker codes as data before an escaped 0x64
+      {"a[bc][]d", "a\x02" "bc" + std::string(1, '\0') + "d"},
+      {"]ab", std::string("\0ab", 3)},    // an end without a start: an empty section at the start
+      {"ab[", "ab"},                      // a start without an end is dropped
+  };
+  for (const Case& c : cases) EXPECT_EQ(FinishedScript(c.script), c.bytes) << c.script;
+  EXPECT_EQ(FinishedScript("[" + std::string(200, 'z') + "]"), "\xC8\x01" + std::string(200, 'z'));
+  EXPECT_EQ(Written([](ProtoBufByteOutputStream* s) { s->WriteString(VekString("hi")); }), "\x02hi");
+}
+
+TEST(ProtoBufByteOutputStreamTest, FinishMatchesAPlainEncoderOnRandomTrees) {
+  std::mt19937 random(42);
+  // Returns the finished bytes of a random tree written into `stream`, computed the plain way.
+  std::function<std::string(ProtoBufByteOutputStream&, int)> writeTree = [&](ProtoBufByteOutputStream& stream,
+                                                                           int depth) {
+    std::string out;
+    int items = static_cast<int>(random() % 6);
+    for (int i = 0; i < items; ++i) {
+      if (depth < 6 && random() % 3 == 0) {
+        stream.StartSection();
+        std::string inner = writeTree(stream, depth + 1);
+        stream.EndSection();
+        for (size_t n = inner.size(); ; n >>= 7) {
+          out.push_back(static_cast<char>((n & 0x7F) | (n >= 0x80 ? 0x80 : 0)));
+          if (n < 0x80) break;
+        }
+        out += inner;
+      } else {
+        static const unsigned char kBytes[] = {0x00, 0x01, 0x02, 0x64, 0x80, 0xFF};
+        size_t run = random() % 300;  // long enough for two-byte lengths
+        for (size_t k = 0; k < run; ++k) {
+          unsigned char b = kBytes[random() % sizeof kBytes];
+          stream.WriteByte(b);
+          out.push_back(static_cast<char>(b));
+        }
+      }
+    }
+    return out;
+  };
+  for (int round = 0; round < 300; ++round) {
+    ProtoBufByteOutputStream stream;
+    std::string expected = writeTree(stream, 0);
+    ASSERT_EQ(Finished(stream), expected) << "round " << round;
+  }
+}
+
+// A section of 2^28 bytes needs a five-byte length, one byte more than its markers free, so Finish
+// inserts into the buffer: inside a second section, whose length must count that insertion too.
+TEST(ProtoBufByteOutputStreamTest, LengthsThatDoNotFitAreInserted) {
+#if defined(__SANITIZE_ADDRESS__)
+  GTEST_SKIP() << "a quarter gigabyte through the instrumented byte loop";
+#endif
+  const size_t n = size_t{1} << 28;
+  ProtoBufByteOutputStream stream;
+  stream.WriteByte('a');
+  stream.StartSection();
+  stream.StartSection();
+  for (size_t i = 0; i < n; ++i) stream.WriteByte(static_cast<unsigned char>(i % 251 == 0 ? 0x64 : 'z'));
+  stream.EndSection();
+  stream.EndSection();
+  stream.WriteByte('b');
+  const unsigned char* data;
+  unsigned long length;
+  stream.Finish(data, length);
+  ASSERT_FALSE(stream.IsOutOfMemory());
+  ASSERT_EQ(length, 1 + 5 + 5 + n + 1);
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(data), 11), "a\x85\x80\x80\x80\x01\x80\x80\x80\x80\x01");
+  EXPECT_EQ(data[11], 0x64);
+  EXPECT_EQ(data[12], 'z');
+  EXPECT_EQ(data[11 + 251], 0x64);
+  EXPECT_EQ(data[length - 1], 'b');
+}
