@@ -38,6 +38,7 @@
 #include "sarn/json/JsonSarnObject.h"
 
 #include "sarn/binary/GoogleInt.h"
+#include "sarn/binary/ProtoBuf.h"
 #include "sarn/binary/ProtoBufByteOutputStream.h"
 
 #include "sarn/rpc/RpcV2Parser.h"

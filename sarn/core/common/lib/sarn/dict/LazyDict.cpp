@@ -1,11 +1,12 @@
-// LazyDict: construction and the conversions of the Dict, JSON and Dictionary forms.
+// LazyDict: construction, the conversions of the Dict, JSON and Dictionary forms to one another,
+// and the object form as an object.
 //
-// The object, protocol-buffer and byte-source forms are converted by the object layer, which
-// is not part of this file yet; wherever a conversion meets one of them it takes the branch of
-// an unknown representation, so that their answers are the documented failures rather than
-// something half-done.
+// The object, protocol-buffer and byte-source forms are not converted to dictionaries or JSON:
+// wherever such a conversion meets one of them it takes the branch of an unknown representation,
+// so that their answers are the documented failures rather than something half-done.
 #include "sarn/dict/LazyDict.h"
 
+#include "sarn/binary/ProtoBuf.h"
 #include "sarn/dict/internal/TreeWalk.h"
 
 namespace sarn {
@@ -187,5 +188,29 @@ VekString LazyDict::ToJson(bool pretty) const {
 }
 
 bool LazyDict::operator==(const LazyDict& other) const { return *ToDict() == *other.ToDict(); }
+
+}  // namespace sarn
+
+namespace sarn {
+
+ref<SarnObject> LazyDict::ToSarnObjectOrErrorString(VekString& error) const {
+  if (repM == REP_OBJECT) return objectM;
+  // Only the object form is held as an object here; every other form is answered as an unknown
+  // form until its conversion to an object is written.
+  error = VekString::Format(pMempoolM, "%s", "unknown rep in LazyDict");
+  return nullptr;
+}
+
+ref<SarnObject> LazyDict::ToSarnObjectOrError() const {
+  VekString error;
+  ref<SarnObject> object = ToSarnObjectOrErrorString(error);
+  return object ? object : MakeErrorObject(pMempoolM, error);
+}
+
+bool LazyDict::ToSarnObject(ref<SarnObject>& out) const {
+  VekString error;
+  out = ToSarnObjectOrErrorString(error);
+  return static_cast<bool>(out);
+}
 
 }  // namespace sarn

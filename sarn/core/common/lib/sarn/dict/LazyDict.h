@@ -86,6 +86,14 @@ class SARN_EXPORT LazyDict : public VekCore {
   ref<vek::ByteBuffer> ToJsonBytestring(bool pretty) const;
   VekString ToJson(bool pretty) const;
 
+  // The payload as an object. The object form gives objectM itself (shared, not copied); on
+  // failure the result is null with the reason in `error`.
+  ref<SarnObject> ToSarnObjectOrErrorString(VekString& error) const;
+  // Never null: an `error` object (code badArgument) with the reason when there is no object.
+  ref<SarnObject> ToSarnObjectOrError() const;
+  // The object or null, the reason discarded; true when there is one.
+  bool ToSarnObject(ref<SarnObject>& out) const;
+
   // Equal compact JSON texts of the two payloads' ToDict().
   bool operator==(const LazyDict& other) const;
   bool operator!=(const LazyDict& other) const { return !(*this == other); }
