@@ -8,6 +8,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
@@ -77,16 +78,20 @@ class TempDir {
 
 }  // namespace
 
-TEST(Schemagen, FixtureTablesMatchTheGoldenDump) {
+// The table dump, and the proto2 mirror of two types (with the closure of their sub-objects).
+TEST(Schemagen, FixtureOutputsMatchTheGoldenFiles) {
   std::string fixture = DataDir() + "/fixture.schema";
-  std::string goldenPath = DataDir() + "/fixture.dump";
-  Outcome run = Schemagen(fixture + " --dump");
-  ASSERT_EQ(run.status, 0) << run.err;
-  EXPECT_EQ(run.err, "");
-  if (std::getenv("SARN_UPDATE_GOLDEN") != nullptr) std::ofstream(goldenPath, std::ios::binary) << run.out;
-  std::string golden;
-  ASSERT_TRUE(sarntest::ReadFile(goldenPath, golden)) << "run with SARN_UPDATE_GOLDEN=1 to create " << goldenPath;
-  EXPECT_EQ(run.out, golden);
+  for (const char* output : {"dump --dump", "proto --proto holder,empty"}) {
+    std::string goldenPath = DataDir() + "/fixture." + std::string(output, std::strchr(output, ' '));
+    Outcome run = Schemagen(fixture + std::strchr(output, ' '));
+    ASSERT_EQ(run.status, 0) << run.err;
+    EXPECT_EQ(run.err, "");
+    if (std::getenv("SARN_UPDATE_GOLDEN") != nullptr) std::ofstream(goldenPath, std::ios::binary) << run.out;
+    std::string golden;
+    ASSERT_TRUE(sarntest::ReadFile(goldenPath, golden)) << "run with SARN_UPDATE_GOLDEN=1 to create " << goldenPath;
+    EXPECT_EQ(run.out, golden) << goldenPath;
+  }
+  EXPECT_EQ(Schemagen(fixture + " --proto holder,nobody").status, 1);
 }
 
 TEST(Schemagen, EveryRefusalNamesItsLine) {

@@ -3,6 +3,7 @@
 //   schemagen SCHEMA --out DIR [--units N] [--stamp FILE]   write DIR/schema/...
 //   schemagen SCHEMA --dump                                 print the tables as text
 //   schemagen SCHEMA --check                                only check the schema
+//   schemagen SCHEMA --proto TYPE[,TYPE...]                 print a proto2 mirror of those types
 //
 // --out also checks that the schema carries the types the runtime names, with their ids and
 // fields; --dump and --check accept any well-formed schema (test fixtures, drafts).
@@ -21,7 +22,7 @@
 namespace {
 
 int Usage() {
-  std::cerr << "usage: schemagen SCHEMA (--out DIR [--units N] [--stamp FILE] | --dump | --check)\n";
+  std::cerr << "usage: schemagen SCHEMA (--out DIR [--units N] [--stamp FILE] | --dump | --check | --proto TYPES)\n";
   return 2;
 }
 
@@ -47,6 +48,8 @@ int main(int argc, char** argv) {
         return Usage();
       }
     }
+  } else if (mode == "--proto") {
+    if (argc != 4) return Usage();
   } else if (mode != "--dump" && mode != "--check") {
     return Usage();
   }
@@ -81,6 +84,17 @@ int main(int argc, char** argv) {
     return 0;
   }
   if (mode == "--check") return 0;
+  if (mode == "--proto") {
+    std::vector<std::string> names;
+    std::stringstream list(argv[3]);
+    for (std::string name; std::getline(list, name, ',');) names.push_back(name);
+    std::string error;
+    if (!schemagen::EmitProto(schema, names, std::cout, error)) {
+      std::cerr << schemaPath << ": " << error << "\n";
+      return 1;
+    }
+    return 0;
+  }
   std::string error;
   if (!schemagen::EmitSchema(schema, outDir, units, error)) {
     std::cerr << error << "\n";

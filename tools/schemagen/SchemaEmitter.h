@@ -4,6 +4,7 @@
 
 #include <ostream>
 #include <string>
+#include <vector>
 
 #include "SchemaModel.h"
 
@@ -16,5 +17,10 @@ bool EmitSchema(const Schema& schema, const std::string& outDir, int units, std:
 
 // Writes every table of the resolved schema as text: one line per record with its twelve bytes.
 void DumpSchema(const Schema& schema, std::ostream& out);
+
+// Writes a proto2 mirror of the listed types (by schema name) and of every type their sub-objects
+// refer to. False (with `error`) when a name is not a type of the schema.
+bool EmitProto(const Schema& schema, const std::vector<std::string>& typeNames, std::ostream& out,
+               std::string& error);
 
 }  // namespace schemagen
