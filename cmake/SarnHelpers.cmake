@@ -56,3 +56,25 @@ function(sarn_add_benchmark source)
   add_executable(${_name} ${source})
   target_link_libraries(${_name} PRIVATE sarn::sarn sarn_benchanchors benchmark::benchmark ${ARGN})
 endfunction()
+
+# A proto2 mirror of the listed schema types (comma-separated), compiled with protoc into a static
+# library `target` (C++ namespace sarnmirror), for tests and benchmarks that compare the binary
+# form with a protocol-buffer library.
+function(sarn_add_proto_mirror target types)
+  find_program(SARN_PROTOC protoc REQUIRED)
+  find_package(PkgConfig REQUIRED)
+  pkg_check_modules(SARN_MIRROR_PROTOBUF REQUIRED IMPORTED_TARGET protobuf)
+  set(_dir ${CMAKE_CURRENT_BINARY_DIR}/${target})
+  add_custom_command(
+    OUTPUT ${_dir}/mirror.pb.cc ${_dir}/mirror.pb.h
+    COMMAND ${CMAKE_COMMAND} -E make_directory ${_dir}
+    COMMAND sh -c "\"$1\" \"$2\" --proto \"$3\" > \"$4\"" sh $<TARGET_FILE:schemagen> ${SARN_SCHEMA_FILE} ${types}
+            ${_dir}/mirror.proto
+    COMMAND ${SARN_PROTOC} --cpp_out=${_dir} -I${_dir} ${_dir}/mirror.proto
+    DEPENDS schemagen ${SARN_SCHEMA_FILE}
+    COMMENT "Generating the protocol-buffer mirror ${target}"
+    VERBATIM)
+  add_library(${target} STATIC ${_dir}/mirror.pb.cc)
+  target_include_directories(${target} SYSTEM PUBLIC ${_dir})
+  target_link_libraries(${target} PUBLIC PkgConfig::SARN_MIRROR_PROTOBUF)
+endfunction()

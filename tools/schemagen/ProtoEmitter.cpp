@@ -81,7 +81,7 @@ bool EmitProto(const Schema& schema, const std::vector<std::string>& typeNames, 
   }
 
   out << "// generated: do not edit. Produced by schemagen --proto from the schema description.\n"
-      << "syntax = \"proto2\";\n\npackage sarnschema;\n\n"
+      << "syntax = \"proto2\";\n\npackage sarnmirror;\n\n"
       << "message AnyDict {\n  repeated AnyDictEntry entries = 4;\n}\n\n"
       << "message AnyDictEntry {\n  optional string name = 6;\n  repeated AnyDictValue values = 8;\n}\n\n"
       << "// A string value, or a nested dictionary's entries.\n"
