@@ -93,6 +93,15 @@ TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
     EXPECT_EQ(value64, c.isOk64 ? c.value64 : 77);
     EXPECT_EQ(cursor, start + (c.isOk64 ? c.consumed : 0));
   }
+  // Every proper prefix of a varint is refused with cursor and value untouched.
+  const std::string tenBytes = "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01";
+  for (size_t n = 0; n < tenBytes.size(); ++n) {
+    const unsigned char* start = reinterpret_cast<const unsigned char*>(tenBytes.data());
+    const unsigned char* cursor = start;
+    unsigned long long value = 77;
+    EXPECT_FALSE(GoogleInt::ReadGoogleU64(&cursor, start + n, &value)) << n;
+    EXPECT_TRUE(cursor == start && value == 77) << n;
+  }
   // Zig-zag undone: even u is u / 2, odd u is ~(u >> 1).
   const unsigned char signedBytes[] = {0x03, 0x04, 0xFF, 0xFF, 0xFF, 0xFF, 0x0F};
   const unsigned char* cursor = signedBytes;
@@ -118,7 +127,18 @@ TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
       {"ab[", "ab"},                      // a start without an end is dropped
   };
   for (const Case& c : cases) EXPECT_EQ(FinishedScript(c.script), c.bytes) << c.script;
-  EXPECT_EQ(FinishedScript("[" + std::string(200, 'z') + "]"), "\xC8\x01" + std::string(200, 'z'));
+  // Lengths at the varint's byte boundaries, and sections nested a thousand deep.
+  for (size_t n : {size_t{127}, size_t{128}, size_t{16383}, size_t{16384}, size_t{1} << 21}) {
+    std::string length;
+    for (size_t v = n; ; v >>= 7) {
+      length.push_back(static_cast<char>((v & 0x7F) | (v >= 0x80 ? 0x80 : 0)));
+      if (v < 0x80) break;
+    }
+    EXPECT_EQ(FinishedScript("[" + std::string(n, 'x') + "]"), length + std::string(n, 'd')) << n;
+  }
+  std::string deep = FinishedScript(std::string(1000, '[') + "x" + std::string(1000, ']'));
+  ASSERT_EQ(deep.size(), 1u + 127 + 873 * 2);  // the 127 innermost lengths take one byte, the rest two
+  EXPECT_EQ(deep.substr(deep.size() - 3), "\x02\x01" "d");
   EXPECT_EQ(Written([](ProtoBufByteOutputStream* s) { s->WriteString(VekString("hi")); }), "\x02hi");
 }
 

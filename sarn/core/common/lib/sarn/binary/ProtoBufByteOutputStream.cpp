@@ -19,10 +19,11 @@ struct OpenSection {
 
 ProtoBufByteOutputStream::~ProtoBufByteOutputStream() { std::free(bytesM.pDataM); }
 
-bool ProtoBufByteOutputStream::Grow() {
+bool ProtoBufByteOutputStream::Grow(size_t more) {
   if (bytesM.isOutOfMemoryM) return false;
-  size_t capacity = bytesM.nCapacityM == 0 ? 1 : bytesM.nCapacityM * 2;
-  void* data = capacity > bytesM.nCapacityM ? std::realloc(bytesM.pDataM, capacity) : nullptr;
+  size_t capacity = bytesM.nCapacityM == 0 ? 1 : bytesM.nCapacityM;
+  while (capacity - bytesM.nSizeM < more && capacity <= SIZE_MAX / 2) capacity *= 2;
+  void* data = capacity - bytesM.nSizeM >= more ? std::realloc(bytesM.pDataM, capacity) : nullptr;
   if (data == nullptr) {
     bytesM.isOutOfMemoryM = true;
     return false;
@@ -32,8 +33,22 @@ bool ProtoBufByteOutputStream::Grow() {
   return true;
 }
 
+// Runs without the marker byte are copied whole; only the 0x64 bytes memchr finds are doubled.
 void ProtoBufByteOutputStream::WriteBytes(const unsigned char* data, unsigned long length) {
-  for (unsigned long i = 0; i < length; ++i) WriteByte(data[i]);
+  const unsigned char* end = data + length;
+  while (data < end) {
+    const void* marker = std::memchr(data, kMarker, static_cast<size_t>(end - data));
+    size_t run = marker != nullptr ? static_cast<size_t>(static_cast<const unsigned char*>(marker) - data)
+                                   : static_cast<size_t>(end - data);
+    if (bytesM.nCapacityM - bytesM.nSizeM < run && !Grow(run)) return;
+    std::memcpy(bytesM.pDataM + bytesM.nSizeM, data, run);
+    bytesM.nSizeM += run;
+    data += run;
+    if (data < end) {
+      WriteByte(kMarker);
+      ++data;
+    }
+  }
 }
 
 void ProtoBufByteOutputStream::WriteString(const VekString& text) {
@@ -67,9 +82,19 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& read, size_t& write) {
       if (depth == 0) break;
       isSectionStart = true;  // an end marker without its start: close the section here
     } else {
+      // Everything after the last 0x64 before `read` is plain data: moved as one run.
+      const void* marker = memrchr(bytes, kMarker, read);
+      size_t start = marker != nullptr ? static_cast<size_t>(static_cast<const unsigned char*>(marker) - bytes) + 1 : 0;
+      if (start < read) {
+        size_t run = read - start;
+        write -= run;
+        read = start;
+        std::memmove(bytes + write, bytes + read, run);
+        continue;
+      }
       unsigned char b = bytes[--read];
-      if (b != kMarker || read == 0) {
-        bytes[--write] = b;
+      if (read == 0) {
+        bytes[--write] = b;  // a lone 0x64 at the very start: data
         continue;
       }
       unsigned char code = bytes[--read];
@@ -127,7 +152,7 @@ size_t ProtoBufByteOutputStream::InsertByte(unsigned char b, size_t& read, size_
     bytesM.pDataM[--write] = b;
     return 0;
   }
-  if (bytesM.nSizeM == bytesM.nCapacityM && !Grow()) return 0;
+  if (bytesM.nSizeM == bytesM.nCapacityM && !Grow(1)) return 0;
   std::memmove(bytesM.pDataM + write + 1, bytesM.pDataM + write, bytesM.nSizeM - write);
   bytesM.pDataM[write] = b;
   ++bytesM.nSizeM;

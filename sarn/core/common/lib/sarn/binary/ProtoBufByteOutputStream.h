@@ -46,7 +46,7 @@ class SARN_EXPORT ProtoBufByteOutputStream {
 
   // Appends b as it is: the markers use it, and WriteByte for data.
   void AppendByte(unsigned char b) {
-    if (bytesM.nSizeM == bytesM.nCapacityM && !Grow()) return;
+    if (bytesM.nSizeM == bytesM.nCapacityM && !Grow(1)) return;
     bytesM.pDataM[bytesM.nSizeM++] = b;
   }
   // A data byte: appended, and appended once more when it is 0x64.
@@ -79,7 +79,8 @@ class SARN_EXPORT ProtoBufByteOutputStream {
  private:
   static constexpr unsigned char kMarker = 0x64;
 
-  bool Grow();
+  // Doubles the capacity until `more` bytes fit; false (and out of memory from then on) otherwise.
+  bool Grow(size_t more);
   // One section's content, backwards from `read`, up to and past its start marker (or the start
   // of the buffer); returns how many bytes had to be inserted into bytesM. Nested sections are
   // kept on an explicit stack, so the depth of the sections never becomes depth of the C stack.
