@@ -155,6 +155,12 @@ TEST_F(ProtoBufTest, ReaderRefusesMalformedFieldsAndSkipsUnknownOnes) {
       EXPECT_EQ(FieldAccess::ScalarValue<uint8_t>(object.Get(), *Field(kTestAllTypes, 4), 0), 1) << c.label;
     }
   }
+  // A MULTI field holds at most 65,535 elements: one more fails the read rather than being dropped.
+  std::string element = "\x28\x01";
+  std::string full;
+  for (int i = 0; i < 65535; ++i) full += element;
+  EXPECT_TRUE(Read(full));
+  EXPECT_FALSE(Read(full + element));
   // A single field given twice keeps the later value; a MULTI field keeps both.
   ref<SarnObject> twice = Read("\xD8\x02\x02\xD8\x02\x04\xE0\x02\x02\xE0\x02\x04");
   ASSERT_TRUE(twice);
