@@ -277,7 +277,11 @@ TEST_F(ProtoBufTest, NestingIsBoundedByTheLimits) {
     Run run{chain(depth), Codec(), false};
     pthread_attr_t attr;
     pthread_attr_init(&attr);
+#if defined(__SANITIZE_ADDRESS__)
+    pthread_attr_setstacksize(&attr, 8 << 20);  // instrumented frames are several times larger
+#else
     pthread_attr_setstacksize(&attr, 256 * 1024);
+#endif
     pthread_t thread;
     ASSERT_EQ(pthread_create(&thread, &attr, read, &run), 0);
     pthread_join(thread, nullptr);
