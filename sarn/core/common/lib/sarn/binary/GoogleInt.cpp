@@ -8,13 +8,22 @@ namespace sarn {
 
 namespace {
 
+// What WriteByte would append byte by byte, with one room check for the whole varint: ten bytes,
+// each possibly doubled as the marker.
 template <class U>
 void WriteVarint(U value, ProtoBufByteOutputStream* out) {
-  while (value >= 0x80) {
-    out->WriteByte(static_cast<unsigned char>((value & 0x7F) | 0x80));
+  if (!out->Reserve(20)) return;
+  unsigned char* bytes = out->bytesM.pDataM;
+  size_t n = out->bytesM.nSizeM;
+  for (;;) {
+    unsigned char byte = value >= 0x80 ? static_cast<unsigned char>((value & 0x7F) | 0x80)
+                                       : static_cast<unsigned char>(value);
+    bytes[n++] = byte;
+    if (byte == 0x64) bytes[n++] = byte;
+    if (value < 0x80) break;
     value >>= 7;
   }
-  out->WriteByte(static_cast<unsigned char>(value));
+  out->bytesM.nSizeM = n;
 }
 
 // One reader for both widths: the last byte may sit at shift kMaxShift at most (28 or 63), so a

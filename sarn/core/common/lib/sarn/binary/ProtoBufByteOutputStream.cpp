@@ -1,5 +1,6 @@
 #include "sarn/binary/ProtoBufByteOutputStream.h"
 
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <initializer_list>
@@ -10,6 +11,12 @@ namespace {
 
 // A frame per open nested section during Finish: where its content ended (`write` when its end
 // marker was met) and the insertions counted by the enclosing level so far.
+// Whether any byte of the word is the marker 0x64 (the classic zero-byte test on word ^ marker).
+inline bool HasMarkerByte(uint64_t word) {
+  uint64_t x = word ^ 0x6464646464646464ull;
+  return ((x - 0x0101010101010101ull) & ~x & 0x8080808080808080ull) != 0;
+}
+
 struct OpenSection {
   size_t endM;
   size_t insertedM;
@@ -51,10 +58,28 @@ void ProtoBufByteOutputStream::WriteBytes(const unsigned char* data, unsigned lo
   }
 }
 
+// Most strings are short: one room check for the markers and the text doubled at worst, then a
+// byte loop; long ones take the run copying of WriteBytes.
 void ProtoBufByteOutputStream::WriteString(const VekString& text) {
-  StartSection();
-  WriteBytes(reinterpret_cast<const unsigned char*>(text.Utf8()), text.NByte());
-  EndSection();
+  const unsigned char* data = reinterpret_cast<const unsigned char*>(text.Utf8());
+  size_t length = text.NByte();
+  if (length > 64 || !Reserve(2 * length + 4)) {
+    StartSection();
+    WriteBytes(data, length);
+    EndSection();
+    return;
+  }
+  unsigned char* bytes = bytesM.pDataM;
+  size_t n = bytesM.nSizeM;
+  bytes[n++] = 0x01;
+  bytes[n++] = kMarker;
+  for (size_t i = 0; i < length; ++i) {
+    bytes[n++] = data[i];
+    if (data[i] == kMarker) bytes[n++] = kMarker;
+  }
+  bytes[n++] = 0x02;
+  bytes[n++] = kMarker;
+  bytesM.nSizeM = n;
 }
 
 void ProtoBufByteOutputStream::Finish(const unsigned char*& data, unsigned long& length) {
@@ -70,7 +95,10 @@ void ProtoBufByteOutputStream::Finish(const unsigned char*& data, unsigned long&
   length = bytesM.nSizeM - write;
 }
 
-size_t ProtoBufByteOutputStream::FinishOneSection(size_t& read, size_t& write) {
+size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeAt) {
+  // Local positions: through the references every byte moved would be a load and a store more.
+  size_t read = readAt;
+  size_t write = writeAt;
   OpenSection* stack = nullptr;
   size_t depth = 0;
   size_t capacity = 0;
@@ -82,16 +110,19 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& read, size_t& write) {
       if (depth == 0) break;
       isSectionStart = true;  // an end marker without its start: close the section here
     } else {
-      // Everything after the last 0x64 before `read` is plain data: moved as one run.
-      const void* marker = memrchr(bytes, kMarker, read);
-      size_t start = marker != nullptr ? static_cast<size_t>(static_cast<const unsigned char*>(marker) - bytes) + 1 : 0;
-      if (start < read) {
-        size_t run = read - start;
-        write -= run;
-        read = start;
-        std::memmove(bytes + write, bytes + read, run);
-        continue;
+      // Plain data up to the previous 0x64 moves eight bytes at a time while a word holds no
+      // marker (each word is loaded before it is stored, so the overlap is harmless), then byte
+      // by byte.
+      while (read >= 8) {
+        uint64_t word;
+        std::memcpy(&word, bytes + read - 8, 8);
+        if (HasMarkerByte(word)) break;
+        read -= 8;
+        write -= 8;
+        std::memcpy(bytes + write, &word, 8);
       }
+      while (read > 0 && bytes[read - 1] != kMarker) bytes[--write] = bytes[--read];
+      if (read == 0) continue;
       unsigned char b = bytes[--read];
       if (read == 0) {
         bytes[--write] = b;  // a lone 0x64 at the very start: data
@@ -132,10 +163,16 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& read, size_t& write) {
     }
   }
   std::free(stack);
+  readAt = read;
+  writeAt = write;
   return inserted;
 }
 
 size_t ProtoBufByteOutputStream::InsertLength(unsigned int length, size_t& read, size_t& write) {
+  if (length < 0x80 && write > read) {  // the common case: one byte, with room
+    bytesM.pDataM[--write] = static_cast<unsigned char>(length);
+    return 0;
+  }
   size_t inserted = 0;
   bool isFirst = true;
   for (unsigned shift : {28u, 21u, 14u, 7u}) {

@@ -55,6 +55,9 @@ class SARN_EXPORT ProtoBufByteOutputStream {
     if (b == kMarker) AppendByte(b);
   }
   void WriteBytes(const unsigned char* data, unsigned long length);
+  // Room for `more` bytes after the current size, so that a caller may append a few bytes without
+  // a check each (the varint writers); false when memory ran out.
+  bool Reserve(size_t more) { return bytesM.nCapacityM - bytesM.nSizeM >= more || Grow(more); }
   // A length-delimited string: a section holding the text's bytes.
   void WriteString(const VekString& text);
   void StartSection() {
