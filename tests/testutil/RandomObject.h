@@ -67,16 +67,16 @@ class RandomObjects {
         return Put(object, field, Next(2) ? kS32[Next(5)] : static_cast<int32_t>(static_cast<uint32_t>(Next())));
       case SARN_DATA_TYPE_INT_ID:
       case SARN_DATA_TYPE_U32:
-        return Put(object, field, Next(4) ? static_cast<uint32_t>(Next(1u << (1 + Next(32)))) : UINT32_MAX);
+        return Put(object, field, Next(4) ? static_cast<uint32_t>(Next(2ull << Next(32))) : UINT32_MAX);
       case SARN_DATA_TYPE_LONG_ID: {
-        uint64_t low = Next(1ull << (1 + Next(48)));
+        uint64_t low = Next(2ull << Next(48));
         uint64_t code = Next(2) ? sarn::longIdPrefixesG[Next(nLongIdPrefixesG)].codeM : 0;
         return Put(object, field, (code << 48) | low);
       }
       case SARN_DATA_TYPE_S64:
       case SARN_DATA_TYPE_U64: return Put(object, field, Next() >> Next(64));
       case SARN_DATA_TYPE_FLOAT:
-        return Put(object, field, static_cast<double>(static_cast<int64_t>(Next())) / (1 << Next(40)));
+        return Put(object, field, static_cast<double>(static_cast<int64_t>(Next())) / static_cast<double>(1ull << Next(40)));
       case SARN_DATA_TYPE_CHANNEL_NUMBER:
         return Put(object, field, ChannelNumber(static_cast<int>(Next(10000)), Next(2) ? -2 : static_cast<int>(Next(100))));
       case SARN_DATA_TYPE_CURRENCY:
