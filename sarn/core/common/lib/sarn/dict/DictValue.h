@@ -60,10 +60,11 @@ class SARN_EXPORT DictValue : public VekCore {
 
   // Equality by the receiver's rule; values of different kinds are never equal.
   virtual bool Equals(const ref<DictValue>& other) const = 0;
-  // Appends the JSON text of the value. Both forms write the same bytes.
+  // Appends the JSON text of the value. Both forms write the same bytes. Out of memory, the
+  // buffer is failed (ByteBuffer::HasFailed); a sink is told through the result of its Write.
   virtual void ToJson(ByteBuffer& out, JsonFormat format) const = 0;
   virtual void ToJson(wynbaselib::Bytesink& out, JsonFormat format) const = 0;
-  // The JSON text of the value as a new string in the value's pool.
+  // The JSON text of the value as a new string in the value's pool; empty when memory runs out.
   virtual VekString ToJson(bool pretty) const;
 
   const Kind kindM;
@@ -94,6 +95,7 @@ class SARN_EXPORT StringValue : public DictValue {
 
   // New values in `pool`. 64-bit integers and texts are quoted; bools, 32-bit integers and
   // floats are bare (a float with a '.' is still written quoted by the writer's bare-text rule).
+  // Null when memory runs out (never a value with its text missing).
   static ref<StringValue> Make(const char* text, VekMempool* pool);
   static ref<StringValue> Make(const ref<vek::ByteBuffer>& bytes, VekMempool* pool);
   static ref<StringValue> Make(bool value, VekMempool* pool);
