@@ -51,6 +51,18 @@ void Replace(VekMempool* pool, VekString& error, const char* message) {
 
 ref<DictValue> Quoted(VekMempool* pool, const VekString& text) { return MempoolNew<StringValue>(pool, text); }
 
+// MakeValue leaves out a missing free-form dictionary or payload; any other null value is an
+// allocation that failed.
+bool IsNullLeftOut(const FieldInfo& field) {
+  return field.dataType == SARN_DATA_TYPE_ANY_DICT || field.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
+}
+
+// For the texts that are never empty (dates, times, enums, channel numbers, currencies): empty
+// only when memory ran out, and then no value at all rather than an empty one.
+ref<DictValue> QuotedText(VekMempool* pool, const VekString& text) {
+  return text.FEmpty() ? ref<DictValue>() : Quoted(pool, text);
+}
+
 const VekString& CachedName(VekMempool* pool, const char* name) { return *GetGlobalName(pool, name); }
 
 }  // namespace
@@ -77,10 +89,15 @@ DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* c
 // ---- object to Dictionary ----
 
 ref<Dictionary> DictionarySarnObject::SarnObjectToDictionary(const SarnObject* object, KernoVersion version) {
+  // Nested calls (a field's objects) keep the outer call's failure and add their own.
+  bool wasOutBefore = wasOutOfMemoryM;
+  wasOutOfMemoryM = false;
   FrameStack stack(pMempoolM);
   ref<Dictionary> result = PushObject(stack, object, version);
   Walk(stack);
-  return result;
+  bool isFailed = wasOutOfMemoryM || !result;
+  wasOutOfMemoryM = wasOutBefore || isFailed;
+  return isFailed ? ref<Dictionary>() : result;
 }
 
 ref<Dictionary> DictionarySarnObject::PushObject(FrameStack& stack, const SarnObject* object, KernoVersion version) {
@@ -88,12 +105,22 @@ ref<Dictionary> DictionarySarnObject::PushObject(FrameStack& stack, const SarnOb
   const StructInfo* info = id < static_cast<unsigned>(structDefCountM) ? structDefsM[id] : nullptr;
   if (info == nullptr) return Dictionary::New(pMempoolM, VekString());
   ref<Dictionary> dictionary = Dictionary::New(pMempoolM, CachedName(pMempoolM, info->pName));
+  if (!dictionary) {
+    wasOutOfMemoryM = true;
+    return dictionary;
+  }
   Frame& frame = stack.Push();
   frame.pObjectM = object;
   frame.pInfoM = info;
   frame.pDictionaryM = dictionary.Get();
   frame.versionM = version;
   return dictionary;
+}
+
+// A child dictionary that could not be attached is gone already: its frame must not be filled.
+void DictionarySarnObject::DropPushed(FrameStack& stack, unsigned depth) {
+  wasOutOfMemoryM = true;
+  if (stack.Count() > depth) stack.Pop();
 }
 
 void DictionarySarnObject::Walk(FrameStack& stack) {
@@ -112,11 +139,16 @@ void DictionarySarnObject::Walk(FrameStack& stack) {
       }
       if (frame.pArrayM == nullptr) {
         ref<ArrayValue> array = new (pMempoolM) ArrayValue();
-        frame.pDictionaryM->Add(*frame.pNameM, array);
+        if (!frame.pDictionaryM->Add(*frame.pNameM, array)) {
+          wasOutOfMemoryM = true;
+          stack.Pop();
+          continue;
+        }
         frame.pArrayM = array.Get();
       }
       ArrayValue* array = frame.pArrayM;
-      array->Add(PushObject(stack, child, frame.versionM));
+      unsigned depth = stack.Count();
+      if (!array->Add(PushObject(stack, child, frame.versionM))) DropPushed(stack, depth);
       continue;
     }
 
@@ -149,7 +181,8 @@ void DictionarySarnObject::Walk(FrameStack& stack) {
       const SarnObject* child = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(object, *field, 0));
       if (child == nullptr) continue;
       Dictionary* parent = frame.pDictionaryM;
-      parent->Add(name, PushObject(stack, child, frame.versionM));
+      unsigned depth = stack.Count();
+      if (!parent->Add(name, PushObject(stack, child, frame.versionM))) DropPushed(stack, depth);
     } else {
       ref<Dictionary> dictionary = frame.pDictionaryM;
       SingleFieldToDict(name, field, object, dictionary, frame.versionM);
@@ -165,13 +198,18 @@ void DictionarySarnObject::SingleFieldToDict(const VekString& name, const FieldI
     if (child != nullptr) value = SarnObjectToDictionary(child, version);
   } else {
     value = MakeValue(*field, object, 0);
+    if (!value && !IsNullLeftOut(*field)) wasOutOfMemoryM = true;
   }
-  if (value != nullptr) dictionary->Add(name, value);
+  if (value != nullptr && !dictionary->Add(name, value)) wasOutOfMemoryM = true;
 }
 
 void DictionarySarnObject::MultiFieldToDict(const VekString& name, const FieldInfo* field, const SarnObject* object,
                                             ref<Dictionary>& dictionary, KernoVersion version) {
   ref<ArrayValue> array = new (pMempoolM) ArrayValue();
+  if (!array) {
+    wasOutOfMemoryM = true;
+    return;
+  }
   unsigned count = FieldAccess::Count(object, *field);
   for (unsigned i = 0; i < count; ++i) {
     ref<DictValue> value;
@@ -180,10 +218,11 @@ void DictionarySarnObject::MultiFieldToDict(const VekString& name, const FieldIn
       if (child != nullptr) value = SarnObjectToDictionary(child, version);
     } else {
       value = MakeValue(*field, object, i);
+      if (!value && !IsNullLeftOut(*field)) wasOutOfMemoryM = true;
     }
-    if (value != nullptr) array->Add(value);
+    if (value != nullptr && !array->Add(value)) wasOutOfMemoryM = true;
   }
-  if (array->CountValues() != 0) dictionary->Add(name, array);
+  if (array->CountValues() != 0 && !dictionary->Add(name, array)) wasOutOfMemoryM = true;
 }
 
 ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const SarnObject* object, unsigned i) {
@@ -198,26 +237,26 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
       return StringValue::Make(bytes, pool);
     }
     case SARN_DATA_TYPE_CHANNEL_NUMBER:
-      return Quoted(pool, FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
+      return QuotedText(pool, FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
     case SARN_DATA_TYPE_CURRENCY:
-      return Quoted(pool, FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
+      return QuotedText(pool, FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
     case SARN_DATA_TYPE_DATE: {
       Date date = FieldAccess::ScalarValue<Date>(object, field, i);
       char text[10];
-      if (!internal::FormatDateText(date.daysM, text)) return Quoted(pool, date.ToString());
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+      if (!internal::FormatDateText(date.daysM, text)) return QuotedText(pool, date.ToString());
+      return QuotedText(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
     }
     case SARN_DATA_TYPE_DATETIME: {
       DateTime dateTime = FieldAccess::ScalarValue<DateTime>(object, field, i);
       char text[19];
-      if (!internal::FormatDateTimeText(dateTime.millisecondsM / 1000, text)) return Quoted(pool, dateTime.ToString());
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+      if (!internal::FormatDateTimeText(dateTime.millisecondsM / 1000, text)) return QuotedText(pool, dateTime.ToString());
+      return QuotedText(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
     }
     case SARN_DATA_TYPE_TIME: {
       int64_t seconds = FieldAccess::ScalarValue<Time>(object, field, i).millisecondsM / 1000;
       char text[8];
       internal::FormatTimeOfDayText(seconds - internal::FloorDiv(seconds, 86400) * 86400, text);
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
+      return QuotedText(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
     }
     case SARN_DATA_TYPE_ANY_DICT: {
       const Dict* dict = static_cast<const Dict*>(FieldAccess::ReferenceAt(object, field, i));
@@ -225,7 +264,7 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
       return dict->GetDictionary();
     }
     case SARN_DATA_TYPE_ENUM:
-      return Quoted(pool, EnumToString(field, FieldAccess::ScalarValue<uint32_t>(object, field, i)));
+      return QuotedText(pool, EnumToString(field, FieldAccess::ScalarValue<uint32_t>(object, field, i)));
     case SARN_DATA_TYPE_FLOAT:
       return StringValue::Make(FieldAccess::ScalarValue<double>(object, field, i), pool);
     case SARN_DATA_TYPE_INT_ID:
@@ -265,7 +304,9 @@ VekString DictionarySarnObject::IdToString(const FieldInfo& field, const SarnObj
   char text[internal::kIdTextRoom];
   size_t length = internal::FormatIdText(pMempoolM, structDefsM, static_cast<uint32_t>(structDefCountM), field,
                                          object, i, text);
-  return VekString::FromUtf8Bytes(pMempoolM, length, text);
+  VekString result = VekString::FromUtf8Bytes(pMempoolM, length, text);
+  if (result.FEmpty() && length != 0) wasOutOfMemoryM = true;
+  return result;
 }
 
 // ---- Dictionary to object ----

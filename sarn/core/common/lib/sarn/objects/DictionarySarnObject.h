@@ -5,8 +5,9 @@
 // present field under its name; scalars become StringValues (BOOL, S32, U32 and FLOAT bare, the
 // rest quoted), nested objects nested dictionaries, multi-valued fields ArrayValues (empty ones
 // and null references are left out); free-form dictionaries and lazy payloads are shared, not
-// copied. This direction cannot fail, and it walks nested objects with an explicit stack, so any
-// depth is converted.
+// copied. This direction fails only when memory runs out (the result is then null, never a tree
+// with a value missing), and it walks nested objects with an explicit stack, so any depth is
+// converted.
 //
 // Dictionary to object: the first "type" value names the type; each field of the type is read
 // from the first value under its name; names that are not fields are ignored. Failures return
@@ -96,6 +97,10 @@ class SARN_EXPORT DictionarySarnObject {
   // Nesting depth of the dictionary being read (the top one is 1), and its bound.
   int depthM;
   int maxDepthM;
+  void DropPushed(FrameStack& stack, unsigned depth);
+  // Set by every allocation of a conversion to a Dictionary that fails, so that the conversion
+  // gives null rather than a tree with a value missing.
+  bool wasOutOfMemoryM = false;
 };
 
 }  // namespace sarn
