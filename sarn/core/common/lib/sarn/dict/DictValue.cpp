@@ -335,7 +335,7 @@ bool StringValue::GetValue(unsigned int& out) const {
 
 bool StringValue::GetValue(ref<vek::ByteBuffer>& out) const {
   out = DecodeBase64(pMempoolM, valueM);
-  return true;
+  return out != nullptr;
 }
 
 namespace {

@@ -90,7 +90,8 @@ class SARN_EXPORT StringValue : public DictValue {
   bool GetValue(int& out) const;                 // as long long, within the 32-bit range
   bool GetValue(unsigned long long& out) const;  // sscanf "%llu"
   bool GetValue(unsigned int& out) const;        // as unsigned long long, at most 4294967295
-  // Always succeeds: the Base64 decoding of the text (empty when it does not decode).
+  // The Base64 decoding of the text (empty when it does not decode); false only when memory
+  // runs out.
   bool GetValue(ref<vek::ByteBuffer>& out) const;
 
   // New values in `pool`. 64-bit integers and texts are quoted; bools, 32-bit integers and

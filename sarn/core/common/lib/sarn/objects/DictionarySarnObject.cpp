@@ -63,6 +63,13 @@ ref<DictValue> QuotedText(VekMempool* pool, const VekString& text) {
   return text.FEmpty() ? ref<DictValue>() : Quoted(pool, text);
 }
 
+// A store into an object fails only for lack of memory: a source array holds no more elements
+// than a field's array can.
+bool Stored(bool isStored, VekMempool* pool, VekString& error) {
+  if (!isStored) Append(pool, error, kOutOfMemoryMessage);
+  return isStored;
+}
+
 const VekString& CachedName(VekMempool* pool, const char* name) { return *GetGlobalName(pool, name); }
 
 }  // namespace
@@ -346,6 +353,7 @@ bool DictionarySarnObject::DictionaryToSarnObject(const ref<Dictionary>& diction
     return false;
   }
   ref<SarnObject> object = info->pFactory(pool);
+  if (!object) return Stored(false, pool, error);
   object->SetDebugLockOwner(0);
 
   struct DepthGuard {
@@ -472,67 +480,67 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
       bool parsed;
       if (!string->GetValue(parsed)) break;
       uint8_t stored = parsed ? 1 : 0;
-      return FieldAccess::PutScalar(object, field, &stored);
+      return Stored(FieldAccess::PutScalar(object, field, &stored), pool, error);
     }
     case SARN_DATA_TYPE_BYTESTRING: {
       ref<vek::ByteBuffer> bytes;
-      string->GetValue(bytes);
-      return FieldAccess::PutReference(object, field, bytes.Get());
+      if (!string->GetValue(bytes)) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, bytes.Get()), pool, error);
     }
     case SARN_DATA_TYPE_CHANNEL_NUMBER: {
       ChannelNumber parsed = ChannelNumber::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_CURRENCY: {
       Currency parsed = Currency::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATE: {
       Date parsed = Date::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATETIME: {
       DateTime parsed = DateTime::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_TIME: {
       Time parsed = Time::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_FLOAT: {
       double parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S64: {
       long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S32: {
       int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U32: {
       unsigned int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U64: {
       unsigned long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_STRING:
-      return FieldAccess::PutString(object, field, string->GetValue());
+      return Stored(FieldAccess::PutString(object, field, string->GetValue()), pool, error);
     case SARN_DATA_TYPE_ENUM: {
       uint32_t number;
       if (!StringToEnum(field, string->GetValue(), error, number)) {
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &number);
+      return Stored(FieldAccess::PutScalar(object, field, &number), pool, error);
     }
     case SARN_DATA_TYPE_INT_ID: {
       unsigned int id;
@@ -540,7 +548,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_LONG_ID: {
       unsigned long long id;
@@ -548,7 +556,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_STRING_ID: {
       VekString id;
@@ -556,7 +564,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutString(object, field, id);
+      return Stored(FieldAccess::PutString(object, field, id), pool, error);
     }
     case SARN_DATA_TYPE_ANY_DICT: {
       if (value->kindM != DictValue::KIND_DICTIONARY) {
@@ -564,7 +572,8 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         return false;
       }
       ref<Dict> dict = MempoolNew<Dict>(pool, ref<Dictionary>(static_cast<Dictionary*>(value.Get())));
-      return FieldAccess::PutReference(object, field, dict.Get());
+      if (!dict) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, dict.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT:
     case SARN_DATA_TYPE_SUBDICT: {
@@ -577,12 +586,12 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, fMulti ? " Can't convert inner Dictionary to SarnObject" : ". Can't unmarshal inner Dictionary");
         return false;
       }
-      return FieldAccess::PutReference(object, field, inner.Get());
+      return Stored(FieldAccess::PutReference(object, field, inner.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
       ref<LazyDict> lazy;
       if (!DictValueToLazyDict(value, lazy, error, pool, version)) return false;
-      return FieldAccess::PutReference(object, field, lazy.Get());
+      return Stored(FieldAccess::PutReference(object, field, lazy.Get()), pool, error);
     }
     default: {
       char code[16];
@@ -658,6 +667,10 @@ bool DictionarySarnObject::StringToStringId(VekMempool* pool, const FieldInfo* f
     return false;
   }
   out = skip == 0 ? text : VekString::FromUtf8Bytes(pool, text.NByte() - skip, text.Utf8() + skip);
+  if (out.FEmpty() && text.NByte() != skip) {
+    Append(pool, error, kOutOfMemoryMessage);
+    return false;
+  }
   return true;
 }
 
