@@ -38,11 +38,18 @@ void AppendQuoted(VekMempool* pool, const char* text, size_t length, ByteBuffer&
     AppendText(out, text, length);
     out.AppendByte('"');
   } else {
-    Json::StringToJson(VekString::FromUtf8Bytes(pool, length, text), false, out);
+    VekString copy = VekString::FromUtf8Bytes(pool, length, text);
+    if (copy.FEmpty() && length != 0) return out.Fail();
+    Json::StringToJson(copy, false, out);
   }
 }
 
-void AppendQuoted(const VekString& text, ByteBuffer& out) { Json::StringToJson(text, false, out); }
+// A text made for the value; only an empty byte string has an empty text, any other empty one
+// could not be made.
+void AppendQuoted(const VekString& text, ByteBuffer& out, bool isEmptyAllowed = false) {
+  if (text.FEmpty() && !isEmptyAllowed) return out.Fail();
+  Json::StringToJson(text, false, out);
+}
 
 // `text` holds `length` plain bytes from text[1] on; quotes them in place and appends.
 void QuoteInPlace(char* text, size_t length, ByteBuffer& out) {
@@ -294,7 +301,7 @@ void JsonSarnObject::WriteValue(const FieldInfo& field, const SarnObject* object
       if (bytes == nullptr) {
         AppendText(out, "\"\"", 2);
       } else {
-        AppendQuoted(Dict::FormatBytestring(pMempoolM, bytes), out);
+        AppendQuoted(Dict::FormatBytestring(pMempoolM, bytes), out, bytes->GetLength() == 0);
       }
       break;
     }

@@ -8,7 +8,7 @@
 // sorts below "type", or last when there is none. BOOL, S32 and U32 values are bare; every other
 // scalar travels as a quoted string. A null element of a reference array is left out.
 //
-// Writing never fails and does not recurse on the depth of the object tree: nested objects (also
+// Writing fails only when memory runs out, and does not recurse on the depth of the object tree: nested objects (also
 // objects held by lazy payloads) are walked with an explicit stack, so any depth is written.
 //
 // Ownership and pools: the converter owns nothing but its scratch array; the strings it makes live
@@ -39,9 +39,10 @@ class SARN_EXPORT JsonSarnObject {
   JsonSarnObject(const JsonSarnObject&) = delete;
   JsonSarnObject& operator=(const JsonSarnObject&) = delete;
 
-  // Appends the JSON text of `object` (and everything it holds) to `out`.
+  // Appends the JSON text of `object` (and everything it holds) to `out`; when memory runs out,
+  // `out` is failed (ByteBuffer::HasFailed) rather than left with a piece missing.
   void SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out);
-  // The same text as a new string in pMempoolM.
+  // The same text as a new string in pMempoolM; empty when memory runs out.
   VekString SarnObjectToJson(const SarnObject* object, KernoVersion version);
 
   // One optional or required field (presence is the caller's test). Reference values that are

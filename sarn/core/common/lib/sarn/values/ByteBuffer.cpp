@@ -17,11 +17,15 @@ bool Vek1ByteBuffer::Grow(unsigned long n) {
   if (n > ULONG_MAX - capacity - extra) return false;
   if (!bytesM) bytesM = new (pMempoolM) VekByteString();
   if (bytesM && bytesM->SetLength(capacity + n + extra)) return true;
+  Fail();
+  return false;
+}
+
+void Vek1ByteBuffer::Fail() {
   // Keeping the bytes would let a later, smaller append succeed behind the missing piece.
   isFailedM = true;
   bytesM = nullptr;
   nUsedM = 0;
-  return false;
 }
 
 ByteBuffer::~ByteBuffer() {}

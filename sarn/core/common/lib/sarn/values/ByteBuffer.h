@@ -66,6 +66,9 @@ class SARN_EXPORT Vek1ByteBuffer {
   unsigned long GetLength() const { return static_cast<unsigned long>(nUsedM); }
   // True once an append ran out of memory; the buffer is then empty for good.
   bool HasFailed() const { return isFailedM; }
+  // Fails the buffer as an append that runs out of memory does: for a writer whose piece of
+  // text could not be made.
+  void Fail();
 
   ref<VekByteString> bytesM;  // its length is the capacity; null when it could not be made
   uint64_t nUsedM;            // bytes appended: the first nUsedM bytes of bytesM
@@ -96,6 +99,7 @@ class SARN_EXPORT ByteBuffer {
   unsigned long GetLength() const { return bufferM.GetLength(); }
   // True once an append ran out of memory: what was written is lost and the writer failed.
   bool HasFailed() const { return bufferM.HasFailed(); }
+  void Fail() { bufferM.Fail(); }
 
   Vek1ByteBuffer bufferM;
 };
