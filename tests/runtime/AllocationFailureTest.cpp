@@ -6,6 +6,7 @@
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "wynbaselib/Gzip.h"
 #include "testutil/AllocationFailure.h"
 #include "testutil/ObjectFill.h"
 
@@ -115,6 +116,24 @@ const Row kRowsG[] = {
                                   static_cast<int>(in.protoM.size()), kTestAllTypes, &object);
        endOfRun();
        return isOk ? Outcome{true, ObjectJson(object.Get())} : Outcome{false, "false"};
+     }},
+    {"gzip out and back", "failed",
+     [](VekMempool* pool, const Inputs& in, const std::function<void()>& endOfRun) {
+       wynbaselib::InMemoryBytestream compressed;
+       bool isOk;
+       {
+         wynbaselib::GzipBytesink sink(&compressed, pool);
+         isOk = sink.Write(in.jsonM.data(), in.jsonM.size()) && sink.Flush();
+       }
+       std::string text;
+       if (isOk) {
+         wynbaselib::GunzipBytesource source(&compressed, pool);
+         char block[4096];
+         for (size_t n; (n = source.Read(block, sizeof block)) != 0;) text.append(block, n);
+         isOk = !source.FError();
+       }
+       endOfRun();
+       return isOk ? Outcome{true, text} : Outcome{false, "failed"};
      }},
 };
 

@@ -312,7 +312,8 @@ bool ProtoBuf::UnmarshalKnownDictAsLazyField(Cursor cursor, End end, ref<LazyDic
   ref<vek::ByteBuffer> bytes = vek::ByteBuffer::New(pMempoolM, p, partEnd - p);
   if (!bytes) return false;
   *result = LazyDict::FromBytestring(pMempoolM, bytes, 0);
-  if (!*result) return false;
+  // Empty bytes (or a leading NUL) are no payload; any other null is a payload not made.
+  if (!*result && p != partEnd && *p != 0) return false;
   *cursor = partEnd;
   return true;
 }

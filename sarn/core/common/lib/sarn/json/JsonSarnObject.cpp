@@ -44,8 +44,8 @@ void AppendQuoted(VekMempool* pool, const char* text, size_t length, ByteBuffer&
   }
 }
 
-// A text made for the value; only an empty byte string has an empty text, any other empty one
-// could not be made.
+// A stored string, or a text made for the value: of those only an empty byte string's is empty
+// (`isEmptyAllowed`), any other empty one could not be made.
 void AppendQuoted(const VekString& text, ByteBuffer& out, bool isEmptyAllowed = false) {
   if (text.FEmpty() && !isEmptyAllowed) return out.Fail();
   Json::StringToJson(text, false, out);
@@ -385,7 +385,7 @@ void JsonSarnObject::WriteValue(const FieldInfo& field, const SarnObject* object
       internal::AppendInteger(out, FieldAccess::ScalarValue<uint64_t>(object, field, i), true);
       break;
     case SARN_DATA_TYPE_STRING:
-      AppendQuoted(FieldAccess::StringAt(object, field, i), out);
+      AppendQuoted(FieldAccess::StringAt(object, field, i), out, true);
       break;
     default:
       break;
