@@ -111,6 +111,7 @@ void JsonSarnObject::SarnObjectToJson(const SarnObject* object, KernoVersion ver
   FrameStack stack(pMempoolM);
   PushObject(stack, object, version, out);
   Walk(stack, out);
+  if (stack.HasFailed()) out.Fail();
 }
 
 void JsonSarnObject::WriteFieldName(const char* name, ByteBuffer& out, bool& fFirst) {

@@ -102,7 +102,7 @@ ref<Dictionary> DictionarySarnObject::SarnObjectToDictionary(const SarnObject* o
   FrameStack stack(pMempoolM);
   ref<Dictionary> result = PushObject(stack, object, version);
   Walk(stack);
-  bool isFailed = wasOutOfMemoryM || !result;
+  bool isFailed = wasOutOfMemoryM || !result || stack.HasFailed();
   wasOutOfMemoryM = wasOutBefore || isFailed;
   return isFailed ? ref<Dictionary>() : result;
 }
