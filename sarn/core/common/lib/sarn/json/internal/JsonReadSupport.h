@@ -6,6 +6,7 @@
 #include "sarn/dict/Dictionary.h"
 
 namespace sarn {
+namespace internal {
 
 class JsonReadSupport {
  public:
@@ -54,4 +55,5 @@ class JsonReadSupport {
   VekString vSlotM[kSlots];
 };
 
+}  // namespace internal
 }  // namespace sarn
