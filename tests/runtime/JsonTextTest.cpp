@@ -8,7 +8,7 @@ namespace {
 
 using JsonTextTest = sarntest::PoolTest;
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+using sarntest::Str;
 
 // A source that delivers the given chunks, one per Read (a chunk larger than the request is
 // handed out in pieces).
