@@ -8,6 +8,8 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+
 namespace {
 
 // The Add overloads of the two containers for each type the facade stores.

@@ -18,6 +18,9 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+using internal::TreeWalk;
+
 namespace {
 
 const char kSpacesG[] = "                                                                ";  // 64

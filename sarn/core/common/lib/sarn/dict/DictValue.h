@@ -29,7 +29,9 @@ class ByteBuffer;
 class Dictionary;
 class LazyDict;
 struct InputPointer;
+namespace internal {
 class TreeRelease;
+}  // namespace internal
 
 // How a tree is written as JSON: compact or pretty, and the nesting depth reached so far. Each
 // container increments the depth in its own copy before writing its children.
@@ -166,7 +168,7 @@ class SARN_EXPORT ArrayValue : public DictValue {
   VekGenericArray valuesM;
 
  private:
-  friend class TreeRelease;
+  friend class internal::TreeRelease;
   DictValue* pNextReleaseM;  // link of the per-thread release queue
 };
 

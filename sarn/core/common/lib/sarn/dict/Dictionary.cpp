@@ -17,6 +17,9 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+using internal::TreeWalk;
+
 namespace {
 
 constexpr uint32_t kLinearNames = 8;

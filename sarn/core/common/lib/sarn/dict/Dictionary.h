@@ -28,8 +28,10 @@
 
 namespace sarn {
 
+namespace internal {
 class JsonReadSupport;
 class TreeWalk;
+}  // namespace internal
 class TreeWriter;
 
 class SARN_EXPORT Dictionary : public DictValue {
@@ -115,8 +117,8 @@ class SARN_EXPORT Dictionary : public DictValue {
                                             const JsonLimits& limits);
 
  private:
-  friend class JsonReadSupport;
-  friend class TreeRelease;
+  friend class internal::JsonReadSupport;
+  friend class internal::TreeRelease;
 
   struct Entry {
     VekString nameM;
@@ -147,7 +149,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   };
   void SortedFirsts(SortKey* out) const;
   bool EqualsDictionary(const Dictionary& other) const;
-  friend class TreeWalk;
+  friend class internal::TreeWalk;
   friend class TreeWriter;
 
   Entry* vEntryM;

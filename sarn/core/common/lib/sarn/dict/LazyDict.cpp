@@ -11,6 +11,8 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+
 namespace {
 
 const char kUnknownRepForDictionaryG[] = "LazyDict to Dictionary: unknown representation in LazyDict";

@@ -21,6 +21,8 @@
 
 namespace sarn {
 
+using internal::JsonReadSupport;
+
 namespace {
 
 using Byte = unsigned char;

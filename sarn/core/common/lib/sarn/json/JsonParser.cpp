@@ -16,6 +16,8 @@
 
 namespace sarn {
 
+using internal::JsonReadSupport;
+
 namespace {
 
 const char kSourcePathG[] = "sarn/core/common/lib/sarn/JsonParser";

@@ -25,7 +25,9 @@
 
 namespace sarn {
 
+namespace internal {
 class JsonReadSupport;
+}  // namespace internal
 
 typedef ref<Dictionary> PDictionary;
 typedef ref<DictValue> PDictValue;
@@ -161,7 +163,7 @@ class SARN_EXPORT JsonParser {
   int maxDepthM;
   bool wasChunkRefusedM;    // a chunk failed: EndParse keeps that answer
   const char* pCancelTextM;  // why our callbacks stopped the parse, or null
-  JsonReadSupport* pSupportM;
+  internal::JsonReadSupport* pSupportM;
   char depthTextM[80];
 };
 

@@ -2,11 +2,13 @@
 // objects, so that the depth of an object tree never becomes depth of the C stack.
 //
 // Frames are plain data (copied with memcpy when the stack grows). The first kInline frames live
-// in the stack object itself; deeper walks grow a block in the walker's pool, doubling it.
-// Running out of memory fails the stack rather than the push (see Push): the walkers have one
-// place to check, after the walk. Internal to the library.
+// in the stack object itself; deeper walks grow a block in the walker's pool, doubling it. When
+// the pool cannot supply a bigger block, Push returns null and the stack stays as it was, so the
+// walker can unwind and report the failure. Internal to the library.
 #pragma once
 
+#include <climits>
+#include <cstdint>
 #include <cstring>
 #include <type_traits>
 
@@ -31,25 +33,20 @@ class WalkStack {
   unsigned Count() const { return nCountM; }
   // The top frame; references stay valid until the next Push.
   T& Top() { return pFramesM[nCountM - 1]; }
-  // A new, zeroed top frame. When the frames cannot grow, a zeroed spare frame instead, which
-  // the walk fills but never visits (Top stays where it was), so that subtree is left out and
-  // the stack is failed: the walker's caller must then report a failure.
-  T& Push() {
-    if (nCountM == nCapacityM && !Grow()) {
-      isFailedM = true;
-      std::memset(static_cast<void*>(&spareM), 0, sizeof spareM);
-      return spareM;
-    }
-    T& frame = pFramesM[nCountM++];
-    std::memset(static_cast<void*>(&frame), 0, sizeof frame);
+  // Frame `i` from the bottom (below Count); valid until the next Push.
+  T& At(unsigned i) { return pFramesM[i]; }
+  // A new, zeroed top frame; null when the stack cannot grow.
+  T* Push() {
+    if (nCountM == nCapacityM && !Grow()) return nullptr;
+    T* frame = &pFramesM[nCountM++];
+    std::memset(static_cast<void*>(frame), 0, sizeof *frame);
     return frame;
   }
   void Pop() { --nCountM; }
-  // True once a push found no memory: the walk left something out.
-  bool HasFailed() const { return isFailedM; }
 
  private:
   bool Grow() {
+    if (nCapacityM > UINT_MAX / 2 || static_cast<size_t>(nCapacityM) * 2 > SIZE_MAX / sizeof(T)) return false;
     unsigned capacity = nCapacityM * 2;
     T* frames = static_cast<T*>(pMempoolM->Malloc(sizeof(T) * capacity));
     if (frames == nullptr) return false;
@@ -64,8 +61,6 @@ class WalkStack {
   T* pFramesM;
   unsigned nCapacityM;
   unsigned nCountM;
-  bool isFailedM = false;
-  T spareM;
   T inlineM[kInline];
 };
 

@@ -6,6 +6,7 @@
 #include "sarn/dict/Dictionary.h"
 
 namespace sarn {
+namespace internal {
 
 class JsonReadSupport {
  public:
@@ -55,4 +56,5 @@ class JsonReadSupport {
   VekString vSlotM[kSlots];
 };
 
+}  // namespace internal
 }  // namespace sarn
