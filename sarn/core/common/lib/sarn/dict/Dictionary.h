@@ -40,6 +40,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   ~Dictionary() override;
 
   // A new empty dictionary; a non-empty `typeName` is added as the quoted value of "type".
+  // Null when memory runs out.
   static ref<Dictionary> New(VekMempool* pool, const VekString& typeName);
 
   // Adds `value` after the values already under `name` (the value is shared, not copied).

@@ -110,8 +110,7 @@ class JsonSarnObject::Writer {
         return true;
       }
       default:
-        WriteText(field, frame.pObjectM, i);
-        return true;
+        return WriteText(field, frame.pObjectM, i);
     }
   }
 
@@ -133,9 +132,11 @@ class JsonSarnObject::Writer {
     outM.AppendByte('"');
   }
 
-  void WriteText(const FieldInfo& field, const SarnObject* object, unsigned i) {
+  // False when a text could not be made (memory ran out): the value is not written empty.
+  bool WriteText(const FieldInfo& field, const SarnObject* object, unsigned i) {
     internal::FieldText text;
     internal::FormatFieldText(jsonM.pMempoolM, jsonM.pStructDefsM, jsonM.nStructDefsM, field, object, i, text);
+    if (text.isFailedM) return false;
     if (!TraitsOf(field.dataType).fQuotedInJson) {
       AppendText(outM, text.pBytesM, text.nLengthM);
     } else if (internal::IsPlainText(text.pBytesM, text.nLengthM)) {
@@ -145,8 +146,11 @@ class JsonSarnObject::Writer {
     } else if (text.pStringM != nullptr) {
       Json::StringToJson(*text.pStringM, false, outM);
     } else {
-      Json::StringToJson(VekString::FromUtf8Bytes(jsonM.pMempoolM, text.nLengthM, text.pBytesM), false, outM);
+      VekString copy = VekString::FromUtf8Bytes(jsonM.pMempoolM, text.nLengthM, text.pBytesM);
+      if (copy.FEmpty() && text.nLengthM != 0) return false;
+      Json::StringToJson(copy, false, outM);
     }
+    return true;
   }
 
   JsonSarnObject& jsonM;
@@ -171,7 +175,8 @@ VekString JsonSarnObject::SarnObjectToJson(const SarnObject* object, KernoVersio
 
 bool JsonSarnObject::SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out) {
   Writer writer(*this, out);
-  return writer.GetWalk().Run(writer, object, version, JsonFrameData());
+  if (!writer.GetWalk().Run(writer, object, version, JsonFrameData())) out.Fail();
+  return !out.HasFailed();
 }
 
 void JsonSarnObject::WriteFieldName(const char* name, ByteBuffer& out, bool& fFirst) {

@@ -9,8 +9,8 @@
 // scalar travels as a quoted string. A null element of a reference array is left out.
 //
 // Writing does not recurse on the depth of the object tree: nested objects (also objects held by
-// lazy payloads) are walked with an explicit stack, so any depth is written; the only failure is
-// a stack that cannot grow for lack of memory.
+// lazy payloads) are walked with an explicit stack, so any depth is written; it fails only when
+// memory runs out.
 //
 // Ownership and pools: the converter owns nothing but its scratch array; the strings it makes live
 // in pMempoolM and are released before a call returns; the caller owns the output buffer.
@@ -40,10 +40,10 @@ class SARN_EXPORT JsonSarnObject {
   JsonSarnObject(const JsonSarnObject&) = delete;
   JsonSarnObject& operator=(const JsonSarnObject&) = delete;
 
-  // Appends the JSON text of `object` (and everything it holds) to `out`. False only when the
-  // walk's stack could not grow (out of memory); `out` then holds a truncated text.
+  // Appends the JSON text of `object` (and everything it holds) to `out`. False only when memory
+  // runs out; `out` is then failed (ByteBuffer::HasFailed) rather than left with a piece missing.
   bool SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out);
-  // The same text as a new string in pMempoolM; empty when the walk ran out of memory.
+  // The same text as a new string in pMempoolM; empty when memory runs out.
   VekString SarnObjectToJson(const SarnObject* object, KernoVersion version);
 
   // One optional or required field (presence is the caller's test). Reference values that are

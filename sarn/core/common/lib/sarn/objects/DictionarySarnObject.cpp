@@ -40,6 +40,13 @@ void Replace(VekMempool* pool, VekString& error, const char* message) {
   error = VekString::FromUtf8Bytes(pool, std::strlen(message), message);
 }
 
+// A store into an object fails only for lack of memory: a source array holds no more elements
+// than a field's array can.
+bool Stored(bool isStored, VekMempool* pool, VekString& error) {
+  if (!isStored) Append(pool, error, kOutOfMemoryMessage);
+  return isStored;
+}
+
 const VekString& CachedName(VekMempool* pool, const char* name) { return *GetGlobalName(pool, name); }
 
 // Per object: the dictionary being filled, and the key and array of the field being visited.
@@ -66,15 +73,22 @@ class DictionarySarnObject::Builder {
   Walk& GetWalk() { return walkM; }
   ref<Dictionary>& Result() { return resultM; }
 
+  // Memory that runs out anywhere fails the whole conversion (a null result, never a tree with a
+  // value missing): the hooks that cannot stop the walk note it, and the next value stops it.
+  bool WasOutOfMemory() const { return wasOutOfMemoryM; }
+
   void BeginObject(Frame& frame, Frame* parent) {
     VekMempool* pool = converterM.pMempoolM;
     ref<Dictionary> dictionary =
         Dictionary::New(pool, frame.pInfoM != nullptr ? CachedName(pool, frame.pInfoM->pName) : VekString());
     frame.dataM.pDictionaryM = dictionary.Get();
-    if (parent == nullptr) {
+    if (!dictionary) {
+      wasOutOfMemoryM = true;
+    } else if (parent == nullptr) {
       resultM = dictionary;
-    } else {
-      Put(*parent, dictionary);
+    } else if (!Put(*parent, dictionary)) {
+      // The parent did not take it, so it is gone when `dictionary` goes: nothing may fill it.
+      frame.dataM.pDictionaryM = nullptr;
     }
   }
 
@@ -82,15 +96,19 @@ class DictionarySarnObject::Builder {
     VekMempool* pool = converterM.pMempoolM;
     if (frame.pNameM != nullptr) frame.dataM.pKeyM = &CachedName(pool, frame.pNameM);
     frame.dataM.pArrayM = nullptr;
-    if (frame.pFieldM->arity == SARN_ARITY_MULTI) {
+    if (frame.pFieldM->arity == SARN_ARITY_MULTI && !wasOutOfMemoryM) {
       // The walk reports only fields with a value to add, so the array is never left empty.
       ref<ArrayValue> array = new (pool) ArrayValue();
-      frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, array);
+      if (!array || !frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, array)) {
+        wasOutOfMemoryM = true;
+        return;
+      }
       frame.dataM.pArrayM = array.Get();
     }
   }
 
   bool Value(Frame& frame, unsigned i, Child& child) {
+    if (wasOutOfMemoryM) return false;
     const FieldInfo& field = *frame.pFieldM;
     if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
       child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
@@ -98,26 +116,33 @@ class DictionarySarnObject::Builder {
       return true;
     }
     ref<DictValue> value = converterM.MakeValue(field, frame.pObjectM, i);
-    if (value != nullptr) Put(frame, value);
-    return true;
+    if (value == nullptr) {
+      // The walk passes over null references; of the rest only a free-form dictionary without a
+      // tree has nothing to add. Any other null is memory that ran out.
+      if (field.dataType == SARN_DATA_TYPE_ANY_DICT) return true;
+      wasOutOfMemoryM = true;
+      return false;
+    }
+    return Put(frame, value);
   }
 
   void EndField(Frame&) {}
   void EndObject(Frame&) {}
 
  private:
-  // Adds `value` for the field `frame` is visiting: to its array, or under its key.
-  static void Put(Frame& frame, const ref<DictValue>& value) {
-    if (frame.dataM.pArrayM != nullptr) {
-      frame.dataM.pArrayM->Add(value);
-    } else {
-      frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, value);
-    }
+  // Adds `value` for the field `frame` is visiting: to its array, or under its key; false (and
+  // noted) when memory ran out.
+  bool Put(Frame& frame, const ref<DictValue>& value) {
+    bool isAdded = frame.dataM.pArrayM != nullptr ? frame.dataM.pArrayM->Add(value)
+                                                   : frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, value);
+    if (!isAdded) wasOutOfMemoryM = true;
+    return isAdded;
   }
 
   DictionarySarnObject& converterM;
   Walk walkM;
   ref<Dictionary> resultM;
+  bool wasOutOfMemoryM = false;
 };
 
 DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* const* structDefs, int count)
@@ -127,7 +152,8 @@ DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* c
 
 ref<Dictionary> DictionarySarnObject::SarnObjectToDictionary(const SarnObject* object, KernoVersion version) {
   Builder builder(*this);
-  if (!builder.GetWalk().Run(builder, object, version, DictionaryFrameData())) return ref<Dictionary>();
+  bool isWalked = builder.GetWalk().Run(builder, object, version, DictionaryFrameData());
+  if (!isWalked || builder.WasOutOfMemory()) return ref<Dictionary>();
   return builder.Result();
 }
 
@@ -153,14 +179,18 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
   if (traits.fHasText) {
     internal::FieldText text;
     internal::FormatFieldText(pool, structDefsM, static_cast<uint32_t>(structDefCountM), field, object, i, text);
+    if (text.isFailedM) return nullptr;
     ref<StringValue> value;
     if (text.pStringM != nullptr) {
       value = new (pool) StringValue(*text.pStringM);
     } else if (text.isNameM) {
       value = new (pool) StringValue(CachedName(pool, text.pBytesM));
     } else {
-      value = new (pool) StringValue(VekString::FromUtf8Bytes(pool, text.nLengthM, text.pBytesM));
+      VekString copy = VekString::FromUtf8Bytes(pool, text.nLengthM, text.pBytesM);
+      if (copy.FEmpty() && text.nLengthM != 0) return nullptr;
+      value = new (pool) StringValue(copy);
     }
+    if (value == nullptr) return nullptr;
     value->needQuotesM = traits.fQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
     return value;
   }
@@ -213,6 +243,7 @@ bool DictionarySarnObject::DictionaryToSarnObject(const ref<Dictionary>& diction
     return false;
   }
   ref<SarnObject> object = info->pFactory(pool);
+  if (!object) return Stored(false, pool, error);
   object->SetDebugLockOwner(0);
 
   struct DepthGuard {
@@ -339,67 +370,67 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
       bool parsed;
       if (!string->GetValue(parsed)) break;
       uint8_t stored = parsed ? 1 : 0;
-      return FieldAccess::PutScalar(object, field, &stored);
+      return Stored(FieldAccess::PutScalar(object, field, &stored), pool, error);
     }
     case SARN_DATA_TYPE_BYTESTRING: {
       ref<vek::ByteBuffer> bytes;
-      string->GetValue(bytes);
-      return FieldAccess::PutReference(object, field, bytes.Get());
+      if (!string->GetValue(bytes)) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, bytes.Get()), pool, error);
     }
     case SARN_DATA_TYPE_CHANNEL_NUMBER: {
       ChannelNumber parsed = ChannelNumber::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_CURRENCY: {
       Currency parsed = Currency::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATE: {
       Date parsed = Date::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATETIME: {
       DateTime parsed = DateTime::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_TIME: {
       Time parsed = Time::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_FLOAT: {
       double parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S64: {
       long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S32: {
       int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U32: {
       unsigned int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U64: {
       unsigned long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_STRING:
-      return FieldAccess::PutString(object, field, string->GetValue());
+      return Stored(FieldAccess::PutString(object, field, string->GetValue()), pool, error);
     case SARN_DATA_TYPE_ENUM: {
       uint32_t number;
       if (!StringToEnum(field, string->GetValue(), error, number)) {
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &number);
+      return Stored(FieldAccess::PutScalar(object, field, &number), pool, error);
     }
     case SARN_DATA_TYPE_INT_ID: {
       unsigned int id;
@@ -407,7 +438,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_LONG_ID: {
       unsigned long long id;
@@ -415,7 +446,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_STRING_ID: {
       VekString id;
@@ -423,7 +454,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutString(object, field, id);
+      return Stored(FieldAccess::PutString(object, field, id), pool, error);
     }
     case SARN_DATA_TYPE_ANY_DICT: {
       if (value->kindM != DictValue::KIND_DICTIONARY) {
@@ -431,7 +462,8 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         return false;
       }
       ref<Dict> dict = MempoolNew<Dict>(pool, ref<Dictionary>(static_cast<Dictionary*>(value.Get())));
-      return FieldAccess::PutReference(object, field, dict.Get());
+      if (!dict) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, dict.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT:
     case SARN_DATA_TYPE_SUBDICT: {
@@ -444,12 +476,12 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, fMulti ? " Can't convert inner Dictionary to SarnObject" : ". Can't unmarshal inner Dictionary");
         return false;
       }
-      return FieldAccess::PutReference(object, field, inner.Get());
+      return Stored(FieldAccess::PutReference(object, field, inner.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
       ref<LazyDict> lazy;
       if (!DictValueToLazyDict(value, lazy, error, pool, version)) return false;
-      return FieldAccess::PutReference(object, field, lazy.Get());
+      return Stored(FieldAccess::PutReference(object, field, lazy.Get()), pool, error);
     }
     default: {
       char code[16];
@@ -525,6 +557,10 @@ bool DictionarySarnObject::StringToStringId(VekMempool* pool, const FieldInfo* f
     return false;
   }
   out = skip == 0 ? text : VekString::FromUtf8Bytes(pool, text.NByte() - skip, text.Utf8() + skip);
+  if (out.FEmpty() && text.NByte() != skip) {
+    Append(pool, error, kOutOfMemoryMessage);
+    return false;
+  }
   return true;
 }
 

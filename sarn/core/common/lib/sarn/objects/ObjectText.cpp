@@ -35,7 +35,10 @@ void SetString(FieldText& text, const VekString& string) {
   Set(text, string.Utf8(), string.NByte());
 }
 
-void SetMade(FieldText& text, VekString&& string) {
+// Only a byte string's text may be empty (`isEmptyAllowed`); any other made text is empty only when
+// it could not be had.
+void SetMade(FieldText& text, VekString&& string, bool isEmptyAllowed = false) {
+  if (string.FEmpty() && !isEmptyAllowed) text.isFailedM = true;
   text.madeM = static_cast<VekString&&>(string);
   SetString(text, text.madeM);
 }
@@ -89,7 +92,7 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
       if (bytes == nullptr) {
         Set(text, "", 0);
       } else {
-        SetMade(text, Dict::FormatBytestring(pool, bytes));
+        SetMade(text, Dict::FormatBytestring(pool, bytes), bytes->GetLength() == 0);
       }
       return;
     }

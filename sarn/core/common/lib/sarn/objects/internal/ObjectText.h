@@ -31,6 +31,9 @@ struct FieldText {
   size_t nLengthM = 0;
   const VekString* pStringM = nullptr;
   bool isNameM = false;
+  // A text the formatter had to make could not be had (memory ran out); the bytes are then empty
+  // and must not be written as the value.
+  bool isFailedM = false;
   VekString madeM;
   char roomM[kIdTextRoom];
 };
@@ -40,7 +43,8 @@ struct FieldText {
 // Dict::FormatFloat), byte strings in Base64 (a null one empty), the scalar types' ToString forms,
 // enum item names ("INVALID_VALUE:%u" without one), and id texts: the prefix of the type the
 // field refers to (looked up in `structDefs`), then the number (as a long id) or the string, cut
-// to 99 bytes; "XXX" when the field refers to no type. Strings are their own text.
+// to 99 bytes; "XXX" when the field refers to no type. Strings are their own text. When memory
+// runs out for a text that had to be made, text.isFailedM is set.
 void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint32_t nStructDefs,
                      const FieldInfo& field, const SarnObject* object, unsigned i, FieldText& text);
 
