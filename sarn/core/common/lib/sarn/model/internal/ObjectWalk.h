@@ -175,30 +175,45 @@ class ObjectWalk {
     return false;
   }
 
+  enum Step { STEP_DESCEND, STEP_DONE, STEP_FAILED };
+
+  // Visits the values of `frame`, field after field, until one is a schema object to descend
+  // into (then in `child`), the frame has nothing left, or the visitor stops. Values that are not
+  // objects never leave this loop, so they cost no trip through the stack.
+  Step Advance(Visitor& visitor, Frame& frame, Child& child) {
+    for (;;) {
+      if (frame.pFieldM == nullptr && (frame.isOneFieldM || !NextField(visitor, frame))) return STEP_DONE;
+      const FieldInfo& field = *frame.pFieldM;
+      const bool isNullAbsent = TraitsOf(field.dataType).IsNullAbsent();
+      for (unsigned i = frame.nextElementM; i < frame.nElementM; ++i) {
+        if (isNullAbsent && FieldAccess::ReferenceAt(frame.pObjectM, field, i) == nullptr) continue;
+        if (!visitor.Value(frame, i, child)) return STEP_FAILED;
+        if (child.pObjectM != nullptr) {
+          frame.nextElementM = i + 1;
+          return STEP_DESCEND;
+        }
+      }
+      visitor.EndField(frame);
+      frame.pFieldM = nullptr;
+    }
+  }
+
   bool Walk(Visitor& visitor) {
     while (!stackM.Empty()) {
       Frame& frame = stackM.Top();
-      if (frame.pFieldM == nullptr && !NextField(visitor, frame)) {
-        visitor.EndObject(frame);
-        Release(frame);
+      Child child;
+      Step step = Advance(visitor, frame, child);
+      if (step == STEP_FAILED) return Fail(child);
+      if (step == STEP_DONE) {
+        if (frame.isOneFieldM) {
+          *pOneFieldDataM = frame.dataM;
+        } else {
+          visitor.EndObject(frame);
+          Release(frame);
+        }
         stackM.Pop();
         continue;
       }
-      const FieldInfo& field = *frame.pFieldM;
-      unsigned i = FirstValue(frame.pObjectM, field, frame.nextElementM, frame.nElementM);
-      if (i == frame.nElementM) {
-        visitor.EndField(frame);
-        frame.pFieldM = nullptr;
-        if (frame.isOneFieldM) {
-          *pOneFieldDataM = frame.dataM;
-          stackM.Pop();
-        }
-        continue;
-      }
-      frame.nextElementM = i + 1;
-      Child child;
-      if (!visitor.Value(frame, i, child)) return Fail(child);
-      if (child.pObjectM == nullptr) continue;
       Frame* next = stackM.Push();
       if (next == nullptr) return Fail(child);
       next->pObjectM = child.pObjectM;

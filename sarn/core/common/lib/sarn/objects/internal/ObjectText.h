@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
 #include "sarn/model/Schema.h"
 #include "vek/VekMempool.h"
@@ -21,7 +22,7 @@ constexpr size_t kIdTextRoom = 100;
 // One value's text. The bytes are pBytesM[0, nLengthM); where they are those of a string (the
 // field's own, or one the formatter had to make), pStringM points at it, so a writer can share
 // it instead of copying. isNameM says that the bytes are a constant name of the metadata (an enum
-// item), which outlives every writer.
+// item), which outlives every writer; isPlainM that they hold nothing a JSON string escapes.
 struct FieldText {
   FieldText() = default;
   FieldText(const FieldText&) = delete;
@@ -31,10 +32,11 @@ struct FieldText {
   size_t nLengthM = 0;
   const VekString* pStringM = nullptr;
   bool isNameM = false;
+  bool isPlainM = false;           // known to need no JSON escaping (digits, dates, times, literals)
   // A text the formatter had to make could not be had (memory ran out); the bytes are then empty
   // and must not be written as the value.
   bool isFailedM = false;
-  VekString madeM;
+  std::optional<VekString> madeM;  // engaged only when a string had to be made
   char roomM[kIdTextRoom];
 };
 
