@@ -34,6 +34,16 @@ std::string ObjectJson(const SarnObject* object) {
 struct Inputs {
   explicit Inputs(VekMempool* pool) : objectM(StructInfoForId(kTestAllTypes)->pFactory(pool)) {
     sarntest::FillObject(pool, objectM.Get(), 7, 1);
+    // A chain of 30 errors (each the cause of the one before) in the required knownDict field
+    // (number 46): deeper than the inline stacks of the walkers and readers, so they grow too.
+    ref<SarnObject> chain;
+    for (int i = 0; i < 30; ++i) {
+      ref<SarnObject> link = sarnschema::Error::Factory(pool);
+      static_cast<sarnschema::Error*>(link.Get())->codeM = 3;  // badArgument: a code that reads back
+      static_cast<sarnschema::Error*>(link.Get())->causeM = chain;
+      chain = link;
+    }
+    FieldAccess::PutReference(objectM.Get(), StructInfoForId(kTestAllTypes)->vFieldInfo[46], chain.Get());
     jsonM = ObjectJson(objectM.Get());
     dictionaryM = DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG)
                       .SarnObjectToDictionary(objectM.Get(), 0);

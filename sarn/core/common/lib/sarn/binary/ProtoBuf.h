@@ -107,7 +107,8 @@ class SARN_EXPORT ProtoBuf {
   // Wire types 0 (a varint), 1 (eight bytes) and 2 (a length and its bytes); any other fails.
   bool SkipFieldValue(unsigned int wireType, const unsigned char** cursor, const unsigned char* end) const;
 
-  // Version-1 envelopes; never null: an `error` object (code badArgument) on failure.
+  // Version-1 envelopes: an `error` object (code badArgument) on failure; null only when memory
+  // runs out.
   ref<SarnObject> UnmarshalWrapper(const unsigned char* data, int length) const;
   ref<SarnObject> UnmarshalRequestWrapper(const unsigned char** cursor, const unsigned char* end) const;
   ref<SarnObject> UnmarshalResponseWrapper(const unsigned char** cursor, const unsigned char* end) const;

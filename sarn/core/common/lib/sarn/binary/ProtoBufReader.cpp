@@ -461,6 +461,7 @@ ref<SarnObject> ProtoBuf::UnmarshalRequestWrapper(Cursor cursor, End end) const 
   });
   if (failure != nullptr) return MakeErrorObject(pMempoolM, failure);
   request->requestM = LazyDict::FromSarnObject(pMempoolM, ReadBody(bodyBegin, bodyEnd, "request did not unmarshal"), 0);
+  if (!request->requestM) return MakeErrorObject(pMempoolM, kOutOfMemoryMessage);
   return object;
 }
 
@@ -483,6 +484,7 @@ ref<SarnObject> ProtoBuf::UnmarshalResponseWrapper(Cursor cursor, End end) const
   });
   if (failure != nullptr) return MakeErrorObject(pMempoolM, failure);
   response->responseM = LazyDict::FromSarnObject(pMempoolM, ReadBody(bodyBegin, bodyEnd, "response did not unmarshal"), 0);
+  if (!response->responseM) return MakeErrorObject(pMempoolM, kOutOfMemoryMessage);
   return object;
 }
 

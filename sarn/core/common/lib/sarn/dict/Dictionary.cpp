@@ -332,6 +332,7 @@ VekString Dictionary::ToJson(bool pretty) const { return DictValue::ToJson(prett
 ref<vek::ByteBuffer> Dictionary::ToBytestring(bool pretty) const {
   ByteBuffer text(pMempoolM);
   TreeWalk::Write(*this, text, JsonFormat(pretty));
+  if (text.HasFailed()) return ref<vek::ByteBuffer>();
   return vek::ByteBuffer::New(pMempoolM, text.GetData(), text.GetLength());
 }
 

@@ -83,7 +83,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   void ToJson(ByteBuffer& out, JsonFormat format) const override;
   void ToJson(wynbaselib::Bytesink& out, JsonFormat format) const override;
   VekString ToJson(bool pretty) const override;
-  // The JSON text as a new byte string in the dictionary's pool.
+  // The JSON text as a new byte string in the dictionary's pool; null when memory runs out.
   ref<vek::ByteBuffer> ToBytestring(bool pretty) const;
   void SetDebugLockOwner(VekLockId) {}
 
