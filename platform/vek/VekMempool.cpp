@@ -61,6 +61,7 @@ struct ClassLayout {
   uint32_t endOffsetM;    // one past the last whole block
   uint32_t shiftM;
   uint32_t inverseM;
+  uint32_t cacheLimitM;  // what a cache holds of the class before it spills half back to the slabs
 };
 
 constexpr uint32_t RoundUp16(uint32_t n) { return (n + 15) & ~uint32_t{15}; }
@@ -80,7 +81,9 @@ constexpr ClassLayout MakeLayout(uint32_t c) {
   uint32_t inverse = odd;  // Newton's iteration doubles the correct low bits each step
   for (int i = 0; i < 5; ++i) inverse *= 2 - odd * inverse;
   uint32_t first = RoundUp16(kSlabHeaderBytes + n);
-  return ClassLayout{blockBytes, first, first + n * blockBytes, shift, inverse};
+  uint32_t cacheLimit = static_cast<uint32_t>(VekMempool::kCacheBytesPerClass / blockBytes);
+  cacheLimit = cacheLimit < 16 ? 16 : cacheLimit > 256 ? 256 : cacheLimit;
+  return ClassLayout{blockBytes, first, first + n * blockBytes, shift, inverse, cacheLimit};
 }
 
 struct LayoutTable {
@@ -97,11 +100,7 @@ constexpr LayoutTable kLayoutG = MakeLayoutTable();
 static_assert(kLayoutG.vLayoutM[0].endOffsetM <= VekMempool::kSlabBytes, "blocks fit the slab");
 static_assert(kLayoutG.vLayoutM[2].inverseM * 3u == 1u, "inverse of the odd factor");
 
-// What a cache holds of a class before it spills half back to the slabs.
-constexpr uint32_t CacheLimitOf(size_t c) {
-  size_t n = VekMempool::kCacheBytesPerClass / kLayoutG.vLayoutM[c].blockBytesM;
-  return static_cast<uint32_t>(n < 16 ? 16 : n > 256 ? 256 : n);
-}
+inline uint32_t CacheLimitOf(size_t c) { return kLayoutG.vLayoutM[c].cacheLimitM; }
 
 // Which 64 KiB stretches of the address space are slabs: one bit per stretch, in leaves of
 // 4 GiB made on first use and never freed. It tells a small block (in a slab, no header) from
@@ -166,8 +165,9 @@ inline VekMempool::Slab* SlabOf(const void* p) {
   return reinterpret_cast<VekMempool::Slab*>(reinterpret_cast<uintptr_t>(p) & ~(VekMempool::kSlabBytes - 1));
 }
 
-inline uint8_t& SlackOf(VekMempool::Slab* slab, const void* p) {
-  const ClassLayout& layout = kLayoutG.vLayoutM[slab->classM];
+// The size byte of the block at `p`, in a slab of class `c`.
+inline uint8_t& SlackOf(VekMempool::Slab* slab, size_t c, const void* p) {
+  const ClassLayout& layout = kLayoutG.vLayoutM[c];
   uint32_t offset = static_cast<uint32_t>(static_cast<const char*>(p) - reinterpret_cast<char*>(slab));
   assert(offset >= layout.firstOffsetM && offset < layout.endOffsetM &&
          (offset - layout.firstOffsetM) % layout.blockBytesM == 0 && "address inside a block");
@@ -175,8 +175,8 @@ inline uint8_t& SlackOf(VekMempool::Slab* slab, const void* p) {
   return reinterpret_cast<uint8_t*>(slab)[kSlabHeaderBytes + index];
 }
 
-inline size_t SmallSizeOf(VekMempool::Slab* slab, const void* p) {
-  return kLayoutG.vLayoutM[slab->classM].blockBytesM - SlackOf(slab, p);
+inline size_t SmallSizeOf(VekMempool::Slab* slab, size_t c, const void* p) {
+  return (c + 1) * VekMempool::kClassGranularity - SlackOf(slab, c, p);
 }
 
 }  // namespace
@@ -427,7 +427,7 @@ void* VekMempool::MallocSmall(size_t nByte) {
     if (node == nullptr) return nullptr;
   }
   Slab* slab = SlabOf(node);
-  SlackOf(slab, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
+  SlackOf(slab, c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
   Poison(node, kLayoutG.vLayoutM[c].blockBytesM);
   Unpoison(node, nByte);
   Count(isOwner, nByte, 1);
@@ -439,7 +439,7 @@ void VekMempool::FreeSmall(Slab* slab, void* p) {
   assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
   size_t c = slab->classM;
   bool isOwner = IsOwnerThread();
-  Count(isOwner, 0 - SmallSizeOf(slab, p), 0 - size_t{1});
+  Count(isOwner, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
   Poison(p, kLayoutG.vLayoutM[c].blockBytesM);
   FreeNode* node = static_cast<FreeNode*>(p);
   Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
@@ -486,7 +486,17 @@ bool VekMempool::IsFailingForTest() {
 
 void* VekMempool::Malloc(size_t nByte) {
   if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
-  return nByte <= kMaxSmallBlock ? MallocSmall(nByte) : MallocLarge(nByte);
+  if (nByte > kMaxSmallBlock) return MallocLarge(nByte);
+  // The owner's common case, kept free of calls so that it needs no saved registers.
+  size_t c = ClassOf(nByte);
+  FreeNode* node = ownerCacheM.vHeadM[c];
+  if (!kIsRecyclingG || node == nullptr || !IsOwnerThread()) return MallocSmall(nByte);
+  ownerCacheM.vHeadM[c] = node->pNextM;
+  --ownerCacheM.vCountM[c];
+  SlackOf(SlabOf(node), c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
+  Count(true, nByte, 1);
+  RaiseHighWater();
+  return node;
 }
 
 void* VekMempool::Calloc(size_t nByte) {
@@ -509,7 +519,7 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
   if (isSmall && nByte <= kMaxSmallBlock && ClassOf(nByte) == SlabOf(p)->classM) {
     // Stay in place while the block's size class still fits.
     Slab* slab = SlabOf(p);
-    SlackOf(slab, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
+    SlackOf(slab, slab->classM, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
     Poison(p, kLayoutG.vLayoutM[slab->classM].blockBytesM);
     Unpoison(p, nByte);
     Count(IsOwnerThread(), nByte - old, 0);
@@ -526,7 +536,19 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
 void VekMempool::Free(void* p) {
   if (p == nullptr) return;
   if (IsSlabAddress(p)) {
-    FreeSmall(SlabOf(p), p);
+    Slab* slab = SlabOf(p);
+    size_t c = slab->classM;
+    FreeNode* node = static_cast<FreeNode*>(p);
+    if (!kIsRecyclingG || !IsOwnerThread() || ownerCacheM.vCountM[c] + 1 >= CacheLimitOf(c)) {
+      FreeSmall(slab, p);
+      return;
+    }
+    // The owner's common case, as in Malloc.
+    assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
+    Count(true, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
+    node->pNextM = ownerCacheM.vHeadM[c];
+    ownerCacheM.vHeadM[c] = node;
+    ++ownerCacheM.vCountM[c];
     return;
   }
   LargeHeader* header = HeaderOf(p);
@@ -557,5 +579,5 @@ VekMempool* VekMempool::PoolOf(const void* p) {
 
 size_t VekMempool::SizeOf(const void* p) {
   if (p == nullptr) return 0;
-  return IsSlabAddress(p) ? SmallSizeOf(SlabOf(p), p) : HeaderOf(p)->nByteM;
+  return IsSlabAddress(p) ? SmallSizeOf(SlabOf(p), SlabOf(p)->classM, p) : HeaderOf(p)->nByteM;
 }
