@@ -49,41 +49,25 @@ inline size_t ClassOf(size_t nByte) {
   return nByte == 0 ? 0 : (nByte - 1) / VekMempool::kClassGranularity;
 }
 
-// Where the blocks of a class lie in a slab: the 64-byte slab header, one byte per block (the
-// block's size class minus the size asked for), then the blocks from a 16-byte boundary. A
-// block's index is its offset divided by the block size; offsets are exact multiples of it, so
-// the division is a shift and a multiplication by the inverse of the odd factor modulo 2^32.
+// Where the blocks of a class lie in a slab: the 64-byte slab header, then one byte for each 16
+// bytes of the slab (the size class minus the size asked for, in the byte of the block's first
+// 16), then the blocks. The byte of the block at offset o is at offset o / 16, which is past the
+// header for every block, so finding it takes a shift and no division by the block size.
 constexpr uint32_t kSlabHeaderBytes = 64;
+constexpr uint32_t kFirstBlockOffset = kSlabHeaderBytes + VekMempool::kSlabBytes / VekMempool::kClassGranularity;
 
 struct ClassLayout {
   uint32_t blockBytesM;
-  uint32_t firstOffsetM;  // offset of block 0 in the slab
-  uint32_t endOffsetM;    // one past the last whole block
-  uint32_t shiftM;
-  uint32_t inverseM;
+  uint32_t endOffsetM;   // one past the last whole block
   uint32_t cacheLimitM;  // what a cache holds of the class before it spills half back to the slabs
 };
 
-constexpr uint32_t RoundUp16(uint32_t n) { return (n + 15) & ~uint32_t{15}; }
-
 constexpr ClassLayout MakeLayout(uint32_t c) {
   uint32_t blockBytes = (c + 1) * VekMempool::kClassGranularity;
-  uint32_t slabBytes = VekMempool::kSlabBytes;
-  uint32_t n = (slabBytes - kSlabHeaderBytes) / (blockBytes + 1);
-  while (RoundUp16(kSlabHeaderBytes + n + 1) + (n + 1) * blockBytes <= slabBytes) ++n;
-  while (RoundUp16(kSlabHeaderBytes + n) + n * blockBytes > slabBytes) --n;
-  uint32_t shift = 4;
-  uint32_t odd = c + 1;
-  while ((odd & 1) == 0) {
-    odd >>= 1;
-    ++shift;
-  }
-  uint32_t inverse = odd;  // Newton's iteration doubles the correct low bits each step
-  for (int i = 0; i < 5; ++i) inverse *= 2 - odd * inverse;
-  uint32_t first = RoundUp16(kSlabHeaderBytes + n);
+  uint32_t n = (VekMempool::kSlabBytes - kFirstBlockOffset) / blockBytes;
   uint32_t cacheLimit = static_cast<uint32_t>(VekMempool::kCacheBytesPerClass / blockBytes);
   cacheLimit = cacheLimit < 16 ? 16 : cacheLimit > 256 ? 256 : cacheLimit;
-  return ClassLayout{blockBytes, first, first + n * blockBytes, shift, inverse, cacheLimit};
+  return ClassLayout{blockBytes, kFirstBlockOffset + n * blockBytes, cacheLimit};
 }
 
 struct LayoutTable {
@@ -97,8 +81,7 @@ constexpr LayoutTable MakeLayoutTable() {
 }
 
 constexpr LayoutTable kLayoutG = MakeLayoutTable();
-static_assert(kLayoutG.vLayoutM[0].endOffsetM <= VekMempool::kSlabBytes, "blocks fit the slab");
-static_assert(kLayoutG.vLayoutM[2].inverseM * 3u == 1u, "inverse of the odd factor");
+static_assert(kFirstBlockOffset / VekMempool::kClassGranularity >= kSlabHeaderBytes, "size bytes follow the header");
 
 inline uint32_t CacheLimitOf(size_t c) { return kLayoutG.vLayoutM[c].cacheLimitM; }
 
@@ -167,12 +150,11 @@ inline VekMempool::Slab* SlabOf(const void* p) {
 
 // The size byte of the block at `p`, in a slab of class `c`.
 inline uint8_t& SlackOf(VekMempool::Slab* slab, size_t c, const void* p) {
-  const ClassLayout& layout = kLayoutG.vLayoutM[c];
-  uint32_t offset = static_cast<uint32_t>(static_cast<const char*>(p) - reinterpret_cast<char*>(slab));
-  assert(offset >= layout.firstOffsetM && offset < layout.endOffsetM &&
-         (offset - layout.firstOffsetM) % layout.blockBytesM == 0 && "address inside a block");
-  uint32_t index = ((offset - layout.firstOffsetM) >> layout.shiftM) * layout.inverseM;
-  return reinterpret_cast<uint8_t*>(slab)[kSlabHeaderBytes + index];
+  uintptr_t offset = reinterpret_cast<uintptr_t>(p) - reinterpret_cast<uintptr_t>(slab);
+  assert(offset >= kFirstBlockOffset && offset < kLayoutG.vLayoutM[c].endOffsetM &&
+         (offset - kFirstBlockOffset) % kLayoutG.vLayoutM[c].blockBytesM == 0 && "address inside a block");
+  (void)c;
+  return reinterpret_cast<uint8_t*>(slab)[offset / VekMempool::kClassGranularity];
 }
 
 inline size_t SmallSizeOf(VekMempool::Slab* slab, size_t c, const void* p) {
@@ -289,14 +271,13 @@ VekMempool::Slab* VekMempool::TakeSlabLocked(size_t c) {
     slab = new (memory) Slab;
     nSlabM.fetch_add(1, std::memory_order_relaxed);
   }
-  const ClassLayout& layout = kLayoutG.vLayoutM[c];
   slab->pPoolM = this;
   slab->pFreeM = nullptr;
   slab->classM = static_cast<uint32_t>(c);
   slab->nOutM = 0;
-  slab->carveOffsetM = layout.firstOffsetM;
+  slab->carveOffsetM = kFirstBlockOffset;
   slab->isUsedUpM = false;
-  Poison(reinterpret_cast<char*>(slab) + layout.firstOffsetM, kSlabBytes - layout.firstOffsetM);
+  Poison(reinterpret_cast<char*>(slab) + kFirstBlockOffset, kSlabBytes - kFirstBlockOffset);
   LinkLocked(vRoomyM[c], slab);
   return slab;
 }
