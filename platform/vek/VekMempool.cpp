@@ -217,13 +217,18 @@ VekMempool* VekMempool::Default() {
 
 inline bool VekMempool::IsOwnerThread() const { return pOwnerM == &tThreadMarkerG; }
 
-inline void VekMempool::Count(bool isOwner, size_t nByte, size_t nBlock) {
-  if (isOwner) {
-    // Only the owner writes these, so a load and a store suffice (others only read them).
+inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
+  // Only one thread writes each of the plain counters, so a load and a store suffice (others
+  // only read them). The bytes of all other threads share one counter so that the high water
+  // is one sum away.
+  if (cache == &ownerCacheM) {
     ownerUsedM.store(ownerUsedM.load(std::memory_order_relaxed) + nByte, std::memory_order_relaxed);
-    ownerLiveM.store(ownerLiveM.load(std::memory_order_relaxed) + nBlock, std::memory_order_relaxed);
   } else {
     sharedUsedM.fetch_add(nByte, std::memory_order_relaxed);
+  }
+  if (cache != nullptr) {
+    cache->liveM.store(cache->liveM.load(std::memory_order_relaxed) + nBlock, std::memory_order_relaxed);
+  } else {
     sharedLiveM.fetch_add(nBlock, std::memory_order_relaxed);
   }
 }
@@ -393,10 +398,14 @@ inline VekMempool::Cache* VekMempool::ThreadCacheOf() {
   return tLastCacheSerialG == serialM ? tLastCacheG : FindThreadCache();
 }
 
+inline VekMempool::Cache* VekMempool::KnownCacheOf() {
+  if (IsOwnerThread()) return &ownerCacheM;
+  return tLastCacheSerialG == serialM ? tLastCacheG : nullptr;
+}
+
 void* VekMempool::MallocSmall(size_t nByte) {
   size_t c = ClassOf(nByte);
-  bool isOwner = IsOwnerThread();
-  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
+  Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
   FreeNode* node;
   if (cache != nullptr) {
     if (cache->vHeadM[c] == nullptr && !Refill(cache, c, CacheLimitOf(c) / 2)) return nullptr;
@@ -411,7 +420,7 @@ void* VekMempool::MallocSmall(size_t nByte) {
   SlackOf(slab, c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
   Poison(node, kLayoutG.vLayoutM[c].blockBytesM);
   Unpoison(node, nByte);
-  Count(isOwner, nByte, 1);
+  Count(cache, nByte, 1);
   RaiseHighWater();
   return node;
 }
@@ -419,11 +428,10 @@ void* VekMempool::MallocSmall(size_t nByte) {
 void VekMempool::FreeSmall(Slab* slab, void* p) {
   assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
   size_t c = slab->classM;
-  bool isOwner = IsOwnerThread();
-  Count(isOwner, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
+  Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
+  Count(cache, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
   Poison(p, kLayoutG.vLayoutM[c].blockBytesM);
   FreeNode* node = static_cast<FreeNode*>(p);
-  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
   if (cache == nullptr) {
     lockM.Lock();
     ReturnToSlabLocked(node);
@@ -441,7 +449,7 @@ void* VekMempool::MallocLarge(size_t nByte) {
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
   header->pPoolM = this;
-  Count(IsOwnerThread(), nByte, 1);
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte, 1);
   RaiseHighWater();
   return header + 1;
 }
@@ -453,7 +461,7 @@ void* VekMempool::ReallocLarge(void* p, size_t nByte) {
   LargeHeader* header = static_cast<LargeHeader*>(std::realloc(HeaderOf(p), sizeof(LargeHeader) + nByte));
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
-  Count(IsOwnerThread(), nByte - old, 0);
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
   if (nByte > old) RaiseHighWater();
   return header + 1;
 }
@@ -468,14 +476,16 @@ bool VekMempool::IsFailingForTest() {
 void* VekMempool::Malloc(size_t nByte) {
   if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
   if (nByte > kMaxSmallBlock) return MallocLarge(nByte);
-  // The owner's common case, kept free of calls so that it needs no saved registers.
+  // The common case (a block in the thread's cache), kept free of calls so that it needs no
+  // saved registers; everything else is MallocSmall's.
   size_t c = ClassOf(nByte);
-  FreeNode* node = ownerCacheM.vHeadM[c];
-  if (!kIsRecyclingG || node == nullptr || !IsOwnerThread()) return MallocSmall(nByte);
-  ownerCacheM.vHeadM[c] = node->pNextM;
-  --ownerCacheM.vCountM[c];
+  Cache* cache = KnownCacheOf();
+  FreeNode* node;
+  if (!kIsRecyclingG || cache == nullptr || (node = cache->vHeadM[c]) == nullptr) return MallocSmall(nByte);
+  cache->vHeadM[c] = node->pNextM;
+  --cache->vCountM[c];
   SlackOf(SlabOf(node), c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
-  Count(true, nByte, 1);
+  Count(cache, nByte, 1);
   RaiseHighWater();
   return node;
 }
@@ -503,7 +513,7 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
     SlackOf(slab, slab->classM, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
     Poison(p, kLayoutG.vLayoutM[slab->classM].blockBytesM);
     Unpoison(p, nByte);
-    Count(IsOwnerThread(), nByte - old, 0);
+    Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
     if (nByte > old) RaiseHighWater();
     return p;
   }
@@ -520,21 +530,22 @@ void VekMempool::Free(void* p) {
     Slab* slab = SlabOf(p);
     size_t c = slab->classM;
     FreeNode* node = static_cast<FreeNode*>(p);
-    if (!kIsRecyclingG || !IsOwnerThread() || ownerCacheM.vCountM[c] + 1 >= CacheLimitOf(c)) {
+    Cache* cache = KnownCacheOf();
+    if (!kIsRecyclingG || cache == nullptr || cache->vCountM[c] + 1 >= CacheLimitOf(c)) {
       FreeSmall(slab, p);
       return;
     }
-    // The owner's common case, as in Malloc.
+    // The common case, as in Malloc.
     assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
-    Count(true, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
-    node->pNextM = ownerCacheM.vHeadM[c];
-    ownerCacheM.vHeadM[c] = node;
-    ++ownerCacheM.vCountM[c];
+    Count(cache, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
+    node->pNextM = cache->vHeadM[c];
+    cache->vHeadM[c] = node;
+    ++cache->vCountM[c];
     return;
   }
   LargeHeader* header = HeaderOf(p);
   assert(header->pPoolM == this && "block freed to a pool that did not allocate it");
-  Count(IsOwnerThread(), 0 - header->nByteM, 0 - size_t{1});
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, 0 - header->nByteM, 0 - size_t{1});
   std::free(header);
 }
 
@@ -549,9 +560,6 @@ size_t VekMempool::GetUsedBytes() const {
 
 size_t VekMempool::GetUsedBytesHighWater() const { return highWaterM.load(std::memory_order_relaxed); }
 
-size_t VekMempool::GetLiveBlocks() const {
-  return ownerLiveM.load(std::memory_order_relaxed) + sharedLiveM.load(std::memory_order_relaxed);
-}
 
 VekMempool* VekMempool::PoolOf(const void* p) {
   if (p == nullptr) return nullptr;
