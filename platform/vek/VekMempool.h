@@ -20,12 +20,13 @@
 //
 // Thread safety: every member may be called from any thread at once (an object may be made on
 // one thread and released on another). The thread that constructed the pool counts with plain
-// stores and keeps its cache in the pool; any other thread counts with atomic additions and
-// gets a cache of its own on its first call, handed back to the pool when the thread ends or
-// the pool is destroyed. Caches refill from and spill to the slabs in batches under a spin
-// lock. Used bytes and live blocks are exact whenever the threads' calls are ordered (by a
-// join, a lock, an atomic hand-off). The high water is exact for allocations so ordered; two
-// allocations racing on different threads may each miss the other's bytes.
+// stores and keeps its cache in the pool. Any other thread gets a cache of its own on its first
+// call, handed back to the pool when the thread ends or the pool is destroyed; it counts its
+// blocks in its cache and adds its bytes to a counter shared by all such threads with an atomic
+// addition. Caches refill from and spill to the slabs in batches under a spin lock. Used bytes
+// and live blocks are exact whenever the threads' calls are ordered (by a join, a lock, an
+// atomic hand-off). The high water is exact for allocations so ordered; two allocations racing
+// on different threads may each miss the other's bytes.
 //
 // A pool must outlive every block allocated from it; destroying a pool that still has live
 // blocks reports them on standard error and, in builds without NDEBUG, asserts (the slabs that
