@@ -1,7 +1,6 @@
 // The frame parser: every case is fed whole, byte by byte and split at every position, and must
 // give the same event log each time (body pieces joined) and the same verdict.
 #include "sarn/Sarn.h"
-#include "testutil/EventLog.h"
 #include "testutil/TestUtil.h"
 
 #include <map>
@@ -10,36 +9,43 @@
 namespace {
 
 using sarn::RpcV2Parser;
-using sarntest::EventLog;
 
-class Recorder : public RpcV2Parser::Callbacks {
- public:
-  explicit Recorder(EventLog& log) : logM(log) {}
-  void OnError(const char* message) override { logM.Add(std::string("error ") + message); }
-  void OnHeaderSize(size_t length) override { logM.Add("headerSize " + std::to_string(length)); }
-  void OnBodySize(size_t length) override { logM.Add("bodySize " + std::to_string(length)); }
-  void OnHeaderPair(const char* key, const char* value) override {
-    logM.Add(std::string("header [") + key + "] [" + value + "]");
-  }
+// What the parser reported, one line per event. Body pieces are joined into one line; their
+// number is kept apart, as that is the one thing chunking changes.
+struct Recorder : RpcV2Parser::Callbacks {
+  void OnError(const char* message) override { Add(std::string("error ") + message); }
+  void OnHeaderSize(size_t length) override { Add("headerSize " + std::to_string(length)); }
+  void OnBodySize(size_t length) override { Add("bodySize " + std::to_string(length)); }
+  void OnHeaderPair(const char* key, const char* value) override { Add(std::string("header [") + key + "] [" + value + "]"); }
+  void OnParsingComplete() override { Add("complete"); }
   void OnBodyChunk(const char* data, size_t length) override {
     lastBodyChunkM = data;
-    logM.AddPiece("body", std::string_view(data, length));
+    ++piecesM;
+    emptyPiecesM += length == 0;
+    if (isInBodyM) {
+      eventsM.back().append(data, length);
+    } else {
+      Add("body " + std::string(data, length));
+      isInBodyM = true;
+    }
   }
-  void OnParsingComplete() override { logM.Add("complete"); }
+  void Add(std::string event) {
+    eventsM.push_back(std::move(event));
+    isInBodyM = false;
+  }
+  std::vector<std::string> eventsM;
+  size_t piecesM = 0, emptyPiecesM = 0;
+  bool isInBodyM = false;
   const char* lastBodyChunkM = nullptr;
-
- private:
-  EventLog& logM;
 };
 
 // Feeds the chunks as a reader does (stopping at the first refusal), then ends the input; the
 // log closes with the verdicts of ParseChunk and EndParse.
 // Destroying the parser ends the input once more, so a frame cut short repeats its error.
-EventLog Feed(const std::vector<std::string_view>& chunks) {
-  EventLog log;
+Recorder Feed(const std::vector<std::string_view>& chunks) {
+  Recorder log;
   {
-    Recorder recorder(log);
-    RpcV2Parser parser(recorder);
+    RpcV2Parser parser(log);
     bool isOk = true;
     for (std::string_view chunk : chunks) {
       if (!(isOk = parser.ParseChunk(chunk.data(), chunk.size()))) break;
@@ -59,9 +65,9 @@ std::string Joined(const std::vector<std::string>& lines) {
 // The log of `input` under every feeding must be `expected`.
 void ExpectLog(std::string_view input, const std::vector<std::string>& expected) {
   sarntest::ForEachSplit(input, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
-    EventLog log = Feed(chunks);
-    ASSERT_EQ(log.ToString(), Joined(expected)) << label;
-    ASSERT_EQ(log.EmptyPieceCount(), 0u) << label;
+    Recorder log = Feed(chunks);
+    ASSERT_EQ(Joined(log.eventsM), Joined(expected)) << label;
+    ASSERT_EQ(log.emptyPiecesM, 0u) << label;
   });
 }
 
@@ -111,14 +117,13 @@ TEST(RpcV2ParserTest, WorkedExampleGivesTheSameCallbacksHoweverSplit) {
   ExpectLog(kExample, kExampleLog);
 
   // Only the body pieces differ; they point into the caller's chunk, never into a copy.
-  EXPECT_EQ(Feed({kExample}).PieceCount(), 1u);
-  EXPECT_EQ(Feed(sarntest::FixedChunks(kExample, 1)).PieceCount(), 31u);
-  EXPECT_EQ(Feed({std::string_view(kExample).substr(0, 160), std::string_view(kExample).substr(160)}).PieceCount(), 2u);
-  EventLog log;
-  Recorder recorder(log);
-  RpcV2Parser parser(recorder);
+  EXPECT_EQ(Feed({kExample}).piecesM, 1u);
+  EXPECT_EQ(Feed(sarntest::FixedChunks(kExample, 1)).piecesM, 31u);
+  EXPECT_EQ(Feed({std::string_view(kExample).substr(0, 160), std::string_view(kExample).substr(160)}).piecesM, 2u);
+  Recorder log;
+  RpcV2Parser parser(log);
   EXPECT_TRUE(parser.ParseChunk(kExample.data(), kExample.size()));
-  EXPECT_EQ(recorder.lastBodyChunkM, kExample.data() + 150);
+  EXPECT_EQ(log.lastBodyChunkM, kExample.data() + 150);
   EXPECT_EQ(parser.stateM, RpcV2Parser::StateDone);
   EXPECT_EQ(parser.headerBytesReadM, 135u);
   EXPECT_EQ(parser.bodyBytesReadM, 31u);
@@ -278,13 +283,13 @@ TEST(RpcV2ParserTest, HeaderBlockRequirementsInOrder) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.block);
     const std::string frame = Frame(c.block, std::string(c.bodyLength, '7'));
-    EventLog log = Feed({frame});
-    const std::vector<std::string>& events = log.Events();
+    Recorder log = Feed({frame});
+    const std::vector<std::string>& events = log.eventsM;
     if (c.error != nullptr) {
       // Judged as soon as the block is complete, before any body byte is looked at.
       ASSERT_GE(events.size(), 3u);
       EXPECT_EQ(events[events.size() - 3], "error " + texts.at(c.error));
-      EXPECT_EQ(Feed({std::string_view(frame).substr(0, frame.size() - c.bodyLength)}).Events(), events);
+      EXPECT_EQ(Feed({std::string_view(frame).substr(0, frame.size() - c.bodyLength)}).eventsM, events);
     } else {
       EXPECT_EQ(events[events.size() - 3], "complete");
     }
@@ -301,17 +306,16 @@ TEST(RpcV2ParserTest, DataAfterTheFrame) {
   ExpectLog(kExample + "x", expected);
 
   // Done is kept: every further chunk is refused with the same message, an empty one is not.
-  EventLog log;
-  Recorder recorder(log);
-  RpcV2Parser parser(recorder);
+  Recorder log;
+  RpcV2Parser parser(log);
   ASSERT_TRUE(parser.ParseChunk(kExample.data(), kExample.size()));
-  log.Clear();
+  log.eventsM.clear();
   EXPECT_FALSE(parser.ParseChunk("x", 1));
   EXPECT_FALSE(parser.ParseChunk("y", 1));
   EXPECT_TRUE(parser.ParseChunk(nullptr, 0));
   EXPECT_EQ(parser.stateM, RpcV2Parser::StateDone);
   const std::string unexpectedData = "error RpcV2Parser: Unexpected data after the end of the RPC packet";
-  EXPECT_EQ(log.Events(), std::vector<std::string>({unexpectedData, unexpectedData}));
+  EXPECT_EQ(log.eventsM, std::vector<std::string>({unexpectedData, unexpectedData}));
 }
 
 TEST(RpcV2ParserTest, EndParseAndDestructorInEveryState) {
@@ -331,15 +335,14 @@ TEST(RpcV2ParserTest, EndParseAndDestructorInEveryState) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.prefix);
-    EventLog log;
-    Recorder recorder(log);
-    auto parser = std::make_unique<RpcV2Parser>(recorder);
+    Recorder log;
+    auto parser = std::make_unique<RpcV2Parser>(log);
     ASSERT_TRUE(parser->ParseChunk(kExample.data(), c.prefix));
     ASSERT_EQ(parser->stateM, c.state);
-    const size_t before = log.Events().size();
+    const size_t before = log.eventsM.size();
     EXPECT_EQ(parser->EndParse(), c.error == nullptr);
     parser.reset();  // ends the input once more
-    const std::vector<std::string> added(log.Events().begin() + before, log.Events().end());
+    const std::vector<std::string> added(log.eventsM.begin() + before, log.eventsM.end());
     if (c.error == nullptr) {
       EXPECT_TRUE(added.empty());
     } else {
@@ -348,39 +351,37 @@ TEST(RpcV2ParserTest, EndParseAndDestructorInEveryState) {
   }
 
   // After an error, and between the header block and its judgement, nothing is reported.
-  EventLog log;
-  Recorder recorder(log);
+  Recorder log;
   {
-    RpcV2Parser parser(recorder);
+    RpcV2Parser parser(log);
     EXPECT_FALSE(parser.ParseChunk("MRPC/2 0 0\r\n", 12));
     EXPECT_FALSE(parser.ParseChunk("MRPC", 4));
     EXPECT_TRUE(parser.EndParse());
-    RpcV2Parser judged(recorder);
+    RpcV2Parser judged(log);
     judged.stateM = RpcV2Parser::StateHeaderDone;
     EXPECT_TRUE(judged.EndParse());
   }
-  EXPECT_EQ(log.ToString(), std::string(kInvalidHeaderSize) + "\n");
+  EXPECT_EQ(Joined(log.eventsM), std::string(kInvalidHeaderSize) + "\n");
 }
 
 TEST(RpcV2ParserTest, LargeBodyStreamsThroughWithoutCopies) {
   const std::string body(RpcV2Parser::BODY_LENGTH_LIMIT, 'b');
   const std::string frame = Frame(Block({"RpcId: 1", "Type: response"}), body);
-  EventLog log;
-  Recorder recorder(log);
-  RpcV2Parser parser(recorder);
+  Recorder log;
+  RpcV2Parser parser(log);
   size_t chunks = 0;
   for (std::string_view chunk : sarntest::FixedChunks(frame, 512)) {
     ASSERT_TRUE(parser.ParseChunk(chunk.data(), chunk.size()));
     if (parser.bodyBytesReadM > 0) {
-      ASSERT_GE(recorder.lastBodyChunkM, chunk.data());
-      ASSERT_LT(recorder.lastBodyChunkM, chunk.data() + chunk.size());
+      ASSERT_GE(log.lastBodyChunkM, chunk.data());
+      ASSERT_LT(log.lastBodyChunkM, chunk.data() + chunk.size());
     }
     ++chunks;
   }
   EXPECT_EQ(parser.bodyBytesReadM, body.size());
   EXPECT_EQ(parser.stateM, RpcV2Parser::StateDone);
-  EXPECT_EQ(log.Events()[log.Events().size() - 2], "body " + body);
-  EXPECT_EQ(log.PieceCount(), chunks);  // the first chunk holds the head and the body's start
+  EXPECT_EQ(log.eventsM[log.eventsM.size() - 2], "body " + body);
+  EXPECT_EQ(log.piecesM, chunks);  // the first chunk holds the head and the body's start
 }
 
 }  // namespace
