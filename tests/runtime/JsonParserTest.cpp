@@ -36,33 +36,24 @@ TEST_F(JsonParserTest, GivesOneTreeWhereverTheChunksSplit) {
   });
 }
 
-TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberText) {
+TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberTextAndReportsRefusals) {
   std::string error;
   ref<Dictionary> tree = Parse(&poolM, R"({"k": 1, "k": -0.5E-7, "k": {"k": []}})", &error);
   ASSERT_TRUE(tree) << error;
-  EXPECT_EQ(tree->CountValues(VekString("k")), 3u);
   EXPECT_EQ(Compact(tree), R"({"k": 1, "k": "-0.5E-7", "k": {"k": []}})");
-}
-
-TEST_F(JsonParserTest, ReportsRefusals) {
-  std::string error;
+  bool isOk;
   for (const char* input : {"[1,2]", "42", "\"s\"", "null"}) {
-    bool isOk;
-    ref<Dictionary> tree = Parse(&poolM, {std::string_view(input)}, &isOk, &error);
+    EXPECT_FALSE(Parse(&poolM, {std::string_view(input)}, &isOk, &error)) << input;
     EXPECT_FALSE(isOk) << input;
-    EXPECT_FALSE(tree) << input;
     EXPECT_EQ(error, "The JSON must start with a '{' character") << input;
   }
   // yajl's own words for syntax errors; the tree built so far is kept for the caller.
-  bool isOk;
   ref<Dictionary> partial = Parse(&poolM, {std::string_view(R"({"a":1,})")}, &isOk, &error);
   EXPECT_FALSE(isOk);
-  EXPECT_EQ(error, "parse error: invalid object key (must be a string)\n");
-  EXPECT_EQ(Compact(partial), R"({"a": 1})");
+  EXPECT_EQ(error + Compact(partial), "parse error: invalid object key (must be a string)\n{\"a\": 1}");
   for (const char* input : {"", "{\"a\"", "{a:1}", "{\"a\":tru}", "{\"a\":\"\xFF\"}", "{} {}", "{\"a\":1,}"}) {
     EXPECT_FALSE(Parse(&poolM, input, &error)) << input;
-    EXPECT_NE(error, "") << input;
-    EXPECT_NE(error, "The JSON must start with a '{' character") << input;
+    EXPECT_TRUE(error != "" && error != "The JSON must start with a '{' character") << input;
   }
   EXPECT_FALSE(Parse(&poolM, "", &error));
   EXPECT_EQ(error, "parse error: premature EOF\n") << "an empty text fails when the parse is ended";
