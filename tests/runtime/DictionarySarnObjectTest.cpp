@@ -21,8 +21,7 @@ class DictionaryObjectTest : public sarntest::PoolTest {
 
   ref<Dictionary> Parse(const std::string& json) {
     VekString error;
-    ref<Dictionary> dictionary =
-        Dictionary::FromJson(reinterpret_cast<const unsigned char*>(json.data()), json.size(), error, &poolM);
+    ref<Dictionary> dictionary = Dictionary::FromJson(VekString::FromUtf8Bytes(&poolM, json.size(), json.data()), error, &poolM);
     EXPECT_TRUE(dictionary != nullptr) << error.Utf8();
     return dictionary;
   }
