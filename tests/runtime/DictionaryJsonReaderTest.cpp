@@ -140,8 +140,12 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
     EXPECT_TRUE(tree->Equals(Parse(&poolM, Compact(tree))));
   });
   EXPECT_FALSE(Read(&poolM, Nested(limit + 1), &error));
-  EXPECT_EQ(error.substr(0, 90), "JSON nesting exceeds the depth limit of 512 levels. Failed to parse an array element. "
-                                 "Fail");
+  // Each enclosing array and object adds its words to the inner failure, out to the top.
+  std::string expected = "JSON nesting exceeds the depth limit of 512 levels.";
+  for (int level = 0; level < limit / 2; ++level) {
+    expected += " Failed to parse an array element. Failed to parse value for key k";
+  }
+  EXPECT_EQ(error, expected);
 
   // A limit of our own, with the exact joined text.
   JsonLimits three(3);
