@@ -78,13 +78,10 @@ TEST_F(GzipTest, OneMegabyteRoundTripsThrough512ByteReads) {
   }
   EXPECT_EQ(poolM.GetUsedBytes(), 0u);
   const std::string& bytes = compressed.GetContent();
-  ASSERT_GT(bytes.size(), 18u);
-  EXPECT_LT(bytes.size(), text.size() / 4);
+  EXPECT_TRUE(bytes.size() > 18 && bytes.size() < text.size() / 4) << bytes.size();
   EXPECT_EQ(bytes.substr(0, 3), "\x1f\x8b\x08") << "gzip magic and deflate method";
-
   Gunzipped back = Gunzip(bytes, 512, &poolM);
-  EXPECT_FALSE(back.isErrorM) << back.errorM;
-  EXPECT_EQ(back.errorM, "");
+  EXPECT_TRUE(!back.isErrorM && back.errorM.empty()) << back.errorM;
   EXPECT_TRUE(back.textM == text) << "the 1 MB text differs after the round trip";
   EXPECT_EQ(poolM.GetUsedBytes(), 0u);
 }
@@ -97,14 +94,10 @@ TEST_F(GzipTest, FlushEndsMembersThatReadBackAsOneStream) {
     EXPECT_EQ(out.GetContent().size(), 20u);
     ASSERT_TRUE(sink.Flush());
     EXPECT_EQ(out.GetContent().size(), 20u) << "a second flush adds nothing";
-    ASSERT_TRUE(sink.Write("first ", 6));
-    ASSERT_TRUE(sink.Write("", 0));
-    ASSERT_TRUE(sink.Flush());
-    ASSERT_TRUE(sink.Write("second", 6));
+    ASSERT_TRUE(sink.Write("first ", 6) && sink.Write("", 0) && sink.Flush() && sink.Write("second", 6));
   }  // the destructor ends the pending member
   Gunzipped back = Gunzip(out.GetContent(), 4);
-  EXPECT_EQ(back.textM, "first second");
-  EXPECT_FALSE(back.isErrorM);
+  EXPECT_TRUE(back.textM == "first second" && !back.isErrorM);
 
   InMemoryBytestream untouched;
   { GzipBytesink sink(&untouched); }
@@ -124,9 +117,7 @@ TEST_F(GzipTest, TruncationAtEveryPositionIsAnErrorWithAPrefixOfTheText) {
     EXPECT_EQ(part.isErrorM, !isClean) << "cut at " << cut;
     EXPECT_EQ(part.errorM, isClean ? "" : "truncated gzip stream") << "cut at " << cut;
     EXPECT_EQ(part.textM, (text + "tail").substr(0, part.textM.size())) << "cut at " << cut;
-    if (cut == firstMember) {
-      EXPECT_EQ(part.textM, text);
-    }
+    EXPECT_TRUE(cut != firstMember || part.textM == text);
   }
 }
 
@@ -159,8 +150,7 @@ TEST_F(GzipTest, CorruptionIsToldFromTruncation) {
   EXPECT_TRUE(whole.isErrorM);
   for (size_t block : {1u, 3u, 512u}) {
     Gunzipped chunked = Gunzip(bad, block);
-    EXPECT_EQ(chunked.textM, whole.textM) << block;
-    EXPECT_EQ(chunked.errorM, whole.errorM) << block;
+    EXPECT_TRUE(chunked.textM == whole.textM && chunked.errorM == whole.errorM) << block;
   }
 }
 
@@ -211,14 +201,11 @@ TEST_F(GzipTest, SinkFailureIsStickyAndReported) {
   GzipBytesink sink(&failing, &poolM);
   const std::string text = SampleText(200000);  // more than deflate buffers: it must write
   EXPECT_FALSE(sink.Write(text.data(), text.size()));
-  EXPECT_TRUE(sink.FError());
-  EXPECT_FALSE(sink.Write("x", 1));
-  EXPECT_FALSE(sink.Flush());
+  EXPECT_TRUE(sink.FError() && !sink.Write("x", 1) && !sink.Flush());
 
   InMemoryBytestream out;
   GzipBytesink badLevel(&out, nullptr, 42);
-  EXPECT_FALSE(badLevel.Write("x", 1));
-  EXPECT_TRUE(badLevel.FError());
+  EXPECT_TRUE(!badLevel.Write("x", 1) && badLevel.FError());
 }
 
 }  // namespace
