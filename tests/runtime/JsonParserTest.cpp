@@ -132,27 +132,24 @@ TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
   std::string json = "{\"list\": [";
   for (int i = 0; i < 3000; ++i) json += (i ? ", " : "") + std::string("{\"i\": ") + std::to_string(i) + "}";
   json += "]}";
-  bool isDeleted = false;
-  VekString error("untouched");
-  ref<Dictionary> tree = Dictionary::FromJsonBytesource(new TestSource(json, &isDeleted), error, &poolM);
-  EXPECT_TRUE(isDeleted);
-  EXPECT_EQ(Str(error), "untouched") << "success leaves the message as it was";
-  ASSERT_TRUE(tree);
-  EXPECT_TRUE(tree->Equals(Read(&poolM, json)));
-
-  isDeleted = false;
-  error = VekString();
-  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": [1, 2", &isDeleted), error, &poolM);
-  EXPECT_TRUE(isDeleted);
-  EXPECT_EQ(Str(error), "parse error: premature EOF\n");
-  EXPECT_EQ(Compact(tree), R"({"a": [1, 2]})") << "the partial tree is returned";
-
-  error = VekString();
-  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": 1}", &isDeleted, true), error, &poolM);
-  EXPECT_EQ(Str(error), "Byte source error: truncated stream");
-  error = VekString();
-  EXPECT_FALSE(Dictionary::FromJsonBytesource(new TestSource("[]", &isDeleted), error, &poolM));
-  EXPECT_EQ(Str(error), "The JSON must start with a '{' character");
+  // Success leaves the message as it was; a failed parse returns the partial tree.
+  const struct {
+    std::string text;
+    bool isFailing;
+    std::string result;  // the message, then the compact tree
+  } cases[] = {
+      {json, false, "untouched " + Compact(Read(&poolM, json))},
+      {"{\"a\": [1, 2", false, "parse error: premature EOF\n {\"a\": [1, 2]}"},
+      {"{\"a\": 1}", true, "Byte source error: truncated stream {\"a\": 1}"},
+      {"[]", false, "The JSON must start with a '{' character (null)"},
+  };
+  for (const auto& c : cases) {
+    bool isDeleted = false;
+    VekString error("untouched");
+    ref<Dictionary> tree = Dictionary::FromJsonBytesource(new TestSource(c.text, &isDeleted, c.isFailing), error, &poolM);
+    EXPECT_TRUE(isDeleted);
+    EXPECT_EQ(Str(error) + " " + Compact(tree), c.result);
+  }
 }
 
 TEST_F(JsonParserTest, StackAndEndingFollowTheirContracts) {
