@@ -8,7 +8,6 @@
 
 namespace {
 
-using wynbaselib::Bytesink;
 using wynbaselib::Bytesource;
 using wynbaselib::GunzipBytesource;
 using wynbaselib::GzipBytesink;
@@ -174,15 +173,10 @@ TEST_F(GzipTest, DuplicateReadsTheRestWithoutDisturbingTheOriginal) {
 }
 
 TEST_F(GzipTest, OwnedSourceIsDeletedWithTheReader) {
-  struct Watched : InMemoryBytestream {
-    Watched(const std::string& text, int* deleted) : InMemoryBytestream(text), pDeletedM(deleted) {}
-    ~Watched() override { ++*pDeletedM; }
-    int* pDeletedM;
-  };
   int deleted = 0;
-  Watched kept(Gzip("kept"), &deleted);
+  sarntest::TestSource kept({Gzip("kept")}, &deleted);
   {
-    GunzipBytesource owning(new Watched(Gzip("owned"), &deleted), nullptr, true);
+    GunzipBytesource owning(new sarntest::TestSource({Gzip("owned")}, &deleted), nullptr, true);
     GunzipBytesource borrowing(&kept);
     EXPECT_EQ(ReadAll(owning, 2) + ReadAll(borrowing, 2), "ownedkept");
     EXPECT_EQ(deleted, 0);
@@ -190,14 +184,9 @@ TEST_F(GzipTest, OwnedSourceIsDeletedWithTheReader) {
   EXPECT_EQ(deleted, 1) << "only the owned source goes with its reader";
 }
 
-class FailingSink : public Bytesink {
- public:
-  bool Write(const char*, size_t) override { return false; }
-  bool Flush() override { return false; }
-};
-
 TEST_F(GzipTest, SinkFailureIsStickyAndReported) {
-  FailingSink failing;
+  sarntest::StringSink failing;
+  failing.fFailM = true;
   GzipBytesink sink(&failing, &poolM);
   const std::string text = SampleText(200000);  // more than deflate buffers: it must write
   EXPECT_FALSE(sink.Write(text.data(), text.size()));

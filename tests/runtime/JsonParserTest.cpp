@@ -114,20 +114,6 @@ TEST_F(JsonParserTest, RefusesContainersPastThePlatformCount) {
   EXPECT_EQ(error, "JSON object repeats a key more than 65535 times.");
 }
 
-// A source that counts its deletion and can end in an error.
-class TestSource : public wynbaselib::InMemoryBytestream {
- public:
-  TestSource(const std::string& text, bool* isDeleted, bool isFailing = false)
-      : InMemoryBytestream(text), pIsDeletedM(isDeleted), isFailingM(isFailing) {}
-  ~TestSource() override { *pIsDeletedM = true; }
-  bool FError() const override { return isFailingM; }
-  const char* GetErrorText() const override { return "truncated stream"; }
-
- private:
-  bool* pIsDeletedM;
-  bool isFailingM;
-};
-
 TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
   std::string json = "{\"list\": [";
   for (int i = 0; i < 3000; ++i) json += (i ? ", " : "") + std::string("{\"i\": ") + std::to_string(i) + "}";
@@ -144,10 +130,11 @@ TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
       {"[]", false, "The JSON must start with a '{' character (null)"},
   };
   for (const auto& c : cases) {
-    bool isDeleted = false;
+    int deleted = 0;
     VekString error("untouched");
-    ref<Dictionary> tree = Dictionary::FromJsonBytesource(new TestSource(c.text, &isDeleted, c.isFailing), error, &poolM);
-    EXPECT_TRUE(isDeleted);
+    ref<Dictionary> tree =
+        Dictionary::FromJsonBytesource(new sarntest::TestSource({c.text}, &deleted, c.isFailing), error, &poolM);
+    EXPECT_EQ(deleted, 1);
     EXPECT_EQ(Str(error) + " " + Compact(tree), c.result);
   }
 }

@@ -10,41 +10,8 @@ using JsonTextTest = sarntest::PoolTest;
 
 using sarntest::Str;
 
-// A source that delivers the given chunks, one per Read (a chunk larger than the request is
-// handed out in pieces).
-class ChunkSource : public wynbaselib::Bytesource {
- public:
-  explicit ChunkSource(std::vector<std::string_view> chunks) : chunksM(std::move(chunks)) {}
-  size_t Read(void* buffer, size_t size) override {
-    ++nReadM;
-    while (indexM < chunksM.size() && chunksM[indexM].empty()) ++indexM;
-    if (indexM == chunksM.size()) return 0;
-    std::string_view& chunk = chunksM[indexM];
-    size_t n = std::min(size, chunk.size());
-    std::memcpy(buffer, chunk.data(), n);
-    chunk.remove_prefix(n);
-    return n;
-  }
-  Bytesource* Duplicate() override { return nullptr; }
-  int nReadM = 0;
-
- private:
-  std::vector<std::string_view> chunksM;
-  size_t indexM = 0;
-};
-
-class StringSink : public wynbaselib::Bytesink {
- public:
-  bool Write(const char* data, size_t size) override {
-    textM.append(data, size);
-    ++nWriteM;
-    return !fFailM;
-  }
-  bool Flush() override { return true; }
-  std::string textM;
-  int nWriteM = 0;
-  bool fFailM = false;
-};
+using sarntest::StringSink;
+using ChunkSource = sarntest::TestSource;
 
 // Both writers, checked to agree.
 std::string ToJson(const std::string& text, bool fBareAllowed) {

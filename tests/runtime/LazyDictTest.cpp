@@ -87,20 +87,10 @@ TEST_F(LazyDictTest, DictAndDictionaryFormsShareTheirTrees) {
   EXPECT_TRUE(*other == *fromDict);
 }
 
-// A source that records its deletion.
-class CountedSource : public wynbaselib::InMemoryBytestream {
- public:
-  explicit CountedSource(bool* isDeleted) : InMemoryBytestream(std::string("{}")), pIsDeletedM(isDeleted) {}
-  ~CountedSource() override { *pIsDeletedM = true; }
-
- private:
-  bool* pIsDeletedM;
-};
-
 TEST_F(LazyDictTest, FormsOfTheObjectLayerAnswerAsUnknownForms) {
-  bool isDeleted = false;
+  int deleted = 0;
   std::vector<ref<LazyDict>> payloads = {
-      LazyDict::FromBytesource(&poolM, new CountedSource(&isDeleted), 0),
+      LazyDict::FromBytesource(&poolM, new sarntest::TestSource({"{}"}, &deleted), 0),
       LazyDict::FromJsonString(&poolM, VekString("\x08\x01"), 0),
       LazyDict::New(&poolM, static_cast<LazyDict::Rep>(9), nullptr, nullptr, nullptr, nullptr, 0),
   };
@@ -115,9 +105,9 @@ TEST_F(LazyDictTest, FormsOfTheObjectLayerAnswerAsUnknownForms) {
     VekString name;
     EXPECT_FALSE(payload->GetTypeName(&name));
   }
-  EXPECT_FALSE(isDeleted);
+  EXPECT_EQ(deleted, 0);
   payloads.clear();
-  EXPECT_TRUE(isDeleted) << "the payload owns its byte source";
+  EXPECT_EQ(deleted, 1) << "the payload owns its byte source";
 }
 
 TEST_F(LazyDictTest, PayloadsInsideTreesWriteAndCompareAsPayloads) {
