@@ -75,55 +75,42 @@ TEST(GoogleIntTest, WritersGiveExactBytes) {
   }
 }
 
+// "ok value @bytes consumed", or "no" and what value and cursor were left at, for one reader.
+template <typename T>
+std::string ReadText(bool (*read)(const unsigned char**, const unsigned char*, T*), const std::string& bytes) {
+  const unsigned char* start = reinterpret_cast<const unsigned char*>(bytes.data());
+  const unsigned char* cursor = start;
+  T value = 77;
+  bool isOk = read(&cursor, start + bytes.size(), &value);
+  return (isOk ? "ok " : "no ") + std::to_string(value) + " @" + std::to_string(cursor - start);
+}
+
 TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
-  struct Case {
+  const std::string untouched = "no 77 @0";
+  const struct {
     std::string bytes;
-    bool isOk32;
-    unsigned long long value32;
-    bool isOk64;
-    unsigned long long value64;
-    size_t consumed;  // on success, both widths
+    std::string read32, read64;
   } cases[] = {
-      {"\x05rest", true, 5, true, 5, 1},
-      {"\xAC\x02", true, 300, true, 300, 2},
-      {"\xFF\xFF\xFF\xFF\x7F", true, 0xFFFFFFFF, true, 0x7FFFFFFFFull, 5},  // surplus bits dropped at 32
-      {"\x80\x80\x80\x80\x80\x01", false, 0, true, 1ull << 35, 6},          // six bytes: too long for 32
-      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", false, 0, true, ~0ull, 10},
-      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", false, 0, false, 0, 0},  // eleven bytes
-      {"\x80", false, 0, false, 0, 0},                                          // truncated
-      {"", false, 0, false, 0, 0},
+      {"\x05rest", "ok 5 @1", "ok 5 @1"},
+      {"\xAC\x02", "ok 300 @2", "ok 300 @2"},
+      {"\xFF\xFF\xFF\xFF\x7F", "ok 4294967295 @5", "ok 34359738367 @5"},  // surplus bits dropped at 32
+      {"\x80\x80\x80\x80\x80\x01", untouched, "ok 34359738368 @6"},       // six bytes: too long for 32
+      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", untouched, "ok 18446744073709551615 @10"},
+      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", untouched, untouched},  // eleven bytes
+      {"\x80", untouched, untouched},                                          // truncated
+      {"", untouched, untouched},
   };
-  for (const Case& c : cases) {
-    const unsigned char* start = reinterpret_cast<const unsigned char*>(c.bytes.data());
-    const unsigned char* end = start + c.bytes.size();
-    const unsigned char* cursor = start;
-    unsigned int value32 = 77;
-    EXPECT_EQ(GoogleInt::ReadGoogleU32(&cursor, end, &value32), c.isOk32) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(value32, c.isOk32 ? c.value32 : 77);
-    EXPECT_EQ(cursor, start + (c.isOk32 ? c.consumed : 0));
-    cursor = start;
-    unsigned long long value64 = 77;
-    EXPECT_EQ(GoogleInt::ReadGoogleU64(&cursor, end, &value64), c.isOk64) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(value64, c.isOk64 ? c.value64 : 77);
-    EXPECT_EQ(cursor, start + (c.isOk64 ? c.consumed : 0));
+  for (const auto& c : cases) {
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, c.bytes), c.read32) << testing::PrintToString(c.bytes);
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, c.bytes), c.read64) << testing::PrintToString(c.bytes);
   }
   // Every proper prefix of a varint is refused with cursor and value untouched.
   const std::string tenBytes = "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01";
-  for (size_t n = 0; n < tenBytes.size(); ++n) {
-    const unsigned char* start = reinterpret_cast<const unsigned char*>(tenBytes.data());
-    const unsigned char* cursor = start;
-    unsigned long long value = 77;
-    EXPECT_FALSE(GoogleInt::ReadGoogleU64(&cursor, start + n, &value)) << n;
-    EXPECT_TRUE(cursor == start && value == 77) << n;
-  }
+  for (size_t n = 0; n < tenBytes.size(); ++n) EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, tenBytes.substr(0, n)), untouched);
   // Zig-zag undone: even u is u / 2, odd u is ~(u >> 1).
-  const unsigned char signedBytes[] = {0x03, 0x04, 0xFF, 0xFF, 0xFF, 0xFF, 0x0F};
-  const unsigned char* cursor = signedBytes;
-  int s32 = 0;
-  long long s64 = 0;
-  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2);
-  EXPECT_TRUE(GoogleInt::ReadGoogleS64(&cursor, signedBytes + 7, &s64) && s64 == 2);
-  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2147483647 - 1);
+  EXPECT_EQ(ReadText(GoogleInt::ReadGoogleS32, "\x03") + " " + ReadText(GoogleInt::ReadGoogleS64, "\x04") + " " +
+                ReadText(GoogleInt::ReadGoogleS32, "\xFF\xFF\xFF\xFF\x0F"),
+            "ok -2 @1 ok 2 @1 ok -2147483648 @5");
 }
 
 TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
