@@ -15,6 +15,13 @@ if(SARN_SANITIZE)
   add_compile_options(-fsanitize=address,undefined -fno-omit-frame-pointer -fno-sanitize-recover=undefined)
   add_link_options(-fsanitize=address,undefined)
 endif()
+if(SARN_SANITIZE_THREAD)
+  if(SARN_SANITIZE)
+    message(FATAL_ERROR "SARN_SANITIZE and SARN_SANITIZE_THREAD exclude each other")
+  endif()
+  add_compile_options(-fsanitize=thread -fno-omit-frame-pointer)
+  add_link_options(-fsanitize=thread)
+endif()
 
 # A fuzzing build instruments all of our code for coverage, so that the fuzzers see inside the
 # libraries and not only their own file (the libFuzzer runtime comes with the fuzz targets).

@@ -7,37 +7,176 @@
 #include <initializer_list>
 #include <new>
 
-// Every block starts with a 16-byte header so that the payload keeps malloc's 16-byte
-// alignment: the requested size (for exact accounting and Realloc) and the owning pool.
+#if defined(__SANITIZE_ADDRESS__)
+#define VEK_MEMPOOL_ASAN 1
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define VEK_MEMPOOL_ASAN 1
+#endif
+#endif
+#ifdef VEK_MEMPOOL_ASAN
+#include <sanitizer/asan_interface.h>
+#endif
+
 namespace {
 
-struct BlockHeader {
+// Under AddressSanitizer nothing is recycled: freed small blocks stay poisoned until their
+// slab goes back to the C library, whose own quarantine then takes over.
+#ifdef VEK_MEMPOOL_ASAN
+constexpr bool kIsRecyclingG = false;
+inline void Poison(const void* p, size_t n) { __asan_poison_memory_region(p, n); }
+inline void Unpoison(const void* p, size_t n) { __asan_unpoison_memory_region(p, n); }
+#else
+constexpr bool kIsRecyclingG = true;
+inline void Poison(const void*, size_t) {}
+inline void Unpoison(const void*, size_t) {}
+#endif
+constexpr size_t kSpareLimitG = kIsRecyclingG ? VekMempool::kFreeSlabReserve : 0;
+
+// A large block starts with this header so that its payload keeps malloc's 16-byte alignment.
+struct LargeHeader {
   size_t nByteM;
   VekMempool* pPoolM;
 };
-static_assert(sizeof(BlockHeader) == 16, "block header keeps 16-byte alignment");
+static_assert(sizeof(LargeHeader) == 16, "large block header keeps 16-byte alignment");
 
-inline BlockHeader* HeaderOf(const void* p) {
-  return reinterpret_cast<BlockHeader*>(const_cast<char*>(static_cast<const char*>(p)) - sizeof(BlockHeader));
+inline LargeHeader* HeaderOf(const void* p) {
+  return reinterpret_cast<LargeHeader*>(const_cast<char*>(static_cast<const char*>(p)) - sizeof(LargeHeader));
 }
-
-// Under AddressSanitizer freed blocks go straight back to the C library, so that a use after
-// free inside a pool is caught instead of hidden by recycling.
-#if defined(__SANITIZE_ADDRESS__)
-constexpr bool kIsRecyclingG = false;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-constexpr bool kIsRecyclingG = false;
-#else
-constexpr bool kIsRecyclingG = true;
-#endif
-#else
-constexpr bool kIsRecyclingG = true;
-#endif
 
 inline size_t ClassOf(size_t nByte) {
   // Class c serves payloads of (c * 16, (c + 1) * 16] bytes; 0 bytes uses class 0.
   return nByte == 0 ? 0 : (nByte - 1) / VekMempool::kClassGranularity;
+}
+
+// Where the blocks of a class lie in a slab: the 64-byte slab header, one byte per block (the
+// block's size class minus the size asked for), then the blocks from a 16-byte boundary. A
+// block's index is its offset divided by the block size; offsets are exact multiples of it, so
+// the division is a shift and a multiplication by the inverse of the odd factor modulo 2^32.
+constexpr uint32_t kSlabHeaderBytes = 64;
+
+struct ClassLayout {
+  uint32_t blockBytesM;
+  uint32_t firstOffsetM;  // offset of block 0 in the slab
+  uint32_t endOffsetM;    // one past the last whole block
+  uint32_t shiftM;
+  uint32_t inverseM;
+};
+
+constexpr uint32_t RoundUp16(uint32_t n) { return (n + 15) & ~uint32_t{15}; }
+
+constexpr ClassLayout MakeLayout(uint32_t c) {
+  uint32_t blockBytes = (c + 1) * VekMempool::kClassGranularity;
+  uint32_t slabBytes = VekMempool::kSlabBytes;
+  uint32_t n = (slabBytes - kSlabHeaderBytes) / (blockBytes + 1);
+  while (RoundUp16(kSlabHeaderBytes + n + 1) + (n + 1) * blockBytes <= slabBytes) ++n;
+  while (RoundUp16(kSlabHeaderBytes + n) + n * blockBytes > slabBytes) --n;
+  uint32_t shift = 4;
+  uint32_t odd = c + 1;
+  while ((odd & 1) == 0) {
+    odd >>= 1;
+    ++shift;
+  }
+  uint32_t inverse = odd;  // Newton's iteration doubles the correct low bits each step
+  for (int i = 0; i < 5; ++i) inverse *= 2 - odd * inverse;
+  uint32_t first = RoundUp16(kSlabHeaderBytes + n);
+  return ClassLayout{blockBytes, first, first + n * blockBytes, shift, inverse};
+}
+
+struct LayoutTable {
+  ClassLayout vLayoutM[VekMempool::kNumClasses];
+};
+
+constexpr LayoutTable MakeLayoutTable() {
+  LayoutTable table{};
+  for (uint32_t c = 0; c < VekMempool::kNumClasses; ++c) table.vLayoutM[c] = MakeLayout(c);
+  return table;
+}
+
+constexpr LayoutTable kLayoutG = MakeLayoutTable();
+static_assert(kLayoutG.vLayoutM[0].endOffsetM <= VekMempool::kSlabBytes, "blocks fit the slab");
+static_assert(kLayoutG.vLayoutM[2].inverseM * 3u == 1u, "inverse of the odd factor");
+
+// What a cache holds of a class before it spills half back to the slabs.
+constexpr uint32_t CacheLimitOf(size_t c) {
+  size_t n = VekMempool::kCacheBytesPerClass / kLayoutG.vLayoutM[c].blockBytesM;
+  return static_cast<uint32_t>(n < 16 ? 16 : n > 256 ? 256 : n);
+}
+
+// Which 64 KiB stretches of the address space are slabs: one bit per stretch, in leaves of
+// 4 GiB made on first use and never freed. It tells a small block (in a slab, no header) from
+// a large one (with a header) before anything at a computed address is read.
+constexpr unsigned kSlabShiftG = 16;
+constexpr size_t kLeafWords = (size_t{1} << (32 - kSlabShiftG)) / 64;
+std::atomic<std::atomic<uint64_t>*> vSlabMapG[size_t{1} << 16];
+
+inline bool IsSlabAddress(const void* p) {
+  uintptr_t address = reinterpret_cast<uintptr_t>(p);
+  if ((address >> 48) != 0) return false;
+  std::atomic<uint64_t>* leaf = vSlabMapG[address >> 32].load(std::memory_order_acquire);
+  if (leaf == nullptr) return false;
+  size_t bit = (address >> kSlabShiftG) & ((size_t{1} << (32 - kSlabShiftG)) - 1);
+  return ((leaf[bit / 64].load(std::memory_order_relaxed) >> (bit % 64)) & 1) != 0;
+}
+
+// False when the slab cannot be recorded (an address the map does not cover, or no memory).
+bool MarkSlab(const void* slab, bool isSlab) {
+  uintptr_t address = reinterpret_cast<uintptr_t>(slab);
+  if ((address >> 48) != 0) return false;
+  std::atomic<std::atomic<uint64_t>*>& root = vSlabMapG[address >> 32];
+  std::atomic<uint64_t>* leaf = root.load(std::memory_order_acquire);
+  if (leaf == nullptr) {
+    std::atomic<uint64_t>* fresh = new (std::nothrow) std::atomic<uint64_t>[kLeafWords]();
+    if (fresh == nullptr) return false;
+    if (root.compare_exchange_strong(leaf, fresh, std::memory_order_acq_rel)) {
+      leaf = fresh;
+    } else {
+      delete[] fresh;
+    }
+  }
+  size_t bit = (address >> kSlabShiftG) & ((size_t{1} << (32 - kSlabShiftG)) - 1);
+  uint64_t mask = uint64_t{1} << (bit % 64);
+  if (isSlab) {
+    leaf[bit / 64].fetch_or(mask, std::memory_order_relaxed);
+  } else {
+    leaf[bit / 64].fetch_and(~mask, std::memory_order_relaxed);
+  }
+  return true;
+}
+
+}  // namespace
+
+// The header at the start of every slab. Its fields change under the pool's lock only; the
+// per-block size bytes after it belong to whoever holds the block.
+struct VekMempool::Slab {
+  VekMempool* pPoolM;
+  Slab* pPrevM;
+  Slab* pNextM;
+  FreeNode* pFreeM;       // blocks given back, most recent first
+  uint32_t classM;
+  uint32_t nOutM;         // blocks carved and not on pFreeM: in use or in a cache
+  uint32_t carveOffsetM;  // first byte not carved yet
+  bool isUsedUpM;         // on vUsedUpM: no free block and nothing left to carve
+};
+static_assert(sizeof(VekMempool::Slab) <= kSlabHeaderBytes, "slab header fits its room");
+
+namespace {
+
+inline VekMempool::Slab* SlabOf(const void* p) {
+  return reinterpret_cast<VekMempool::Slab*>(reinterpret_cast<uintptr_t>(p) & ~(VekMempool::kSlabBytes - 1));
+}
+
+inline uint8_t& SlackOf(VekMempool::Slab* slab, const void* p) {
+  const ClassLayout& layout = kLayoutG.vLayoutM[slab->classM];
+  uint32_t offset = static_cast<uint32_t>(static_cast<const char*>(p) - reinterpret_cast<char*>(slab));
+  assert(offset >= layout.firstOffsetM && offset < layout.endOffsetM &&
+         (offset - layout.firstOffsetM) % layout.blockBytesM == 0 && "address inside a block");
+  uint32_t index = ((offset - layout.firstOffsetM) >> layout.shiftM) * layout.inverseM;
+  return reinterpret_cast<uint8_t*>(slab)[kSlabHeaderBytes + index];
+}
+
+inline size_t SmallSizeOf(VekMempool::Slab* slab, const void* p) {
+  return kLayoutG.vLayoutM[slab->classM].blockBytesM - SlackOf(slab, p);
 }
 
 }  // namespace
@@ -50,7 +189,12 @@ namespace {
 thread_local char tThreadMarkerG __attribute__((tls_model("initial-exec")));
 }  // namespace
 
-VekMempool::VekMempool(const char* name) : pOwnerM(&tThreadMarkerG) {
+namespace {
+std::atomic<uint64_t> nextSerialG{1};
+}  // namespace
+
+VekMempool::VekMempool(const char* name)
+    : serialM(nextSerialG.fetch_add(1, std::memory_order_relaxed)), pOwnerM(&tThreadMarkerG) {
   std::snprintf(nameM, sizeof nameM, "%s", name != nullptr ? name : "");
 }
 
@@ -61,16 +205,26 @@ VekMempool::~VekMempool() {
                  GetUsedBytes());
     assert(live == 0 && "pool destroyed with live allocations");
   }
-  for (FreeNode** lists : {vOwnerFreeM, vSharedFreeM}) {
-    for (size_t c = 0; c < kNumClasses; ++c) {
-      FreeNode* node = lists[c];
-      while (node != nullptr) {
-        FreeNode* next = node->pNextM;
-        std::free(HeaderOf(node));
-        node = next;
+  DetachThreadCaches();
+  SpillAll(&ownerCacheM);
+  // Every cached block is back in its slab, so a slab with blocks out holds live (leaked)
+  // blocks: it stays allocated, as those blocks would have.
+  lockM.Lock();
+  while (pSpareM != nullptr) {
+    Slab* slab = pSpareM;
+    pSpareM = slab->pNextM;
+    ReleaseSlabLocked(slab);
+  }
+  for (size_t c = 0; c < kNumClasses; ++c) {
+    for (Slab** list : {&vRoomyM[c], &vUsedUpM[c]}) {
+      for (Slab* slab = *list; slab != nullptr;) {
+        Slab* next = slab->pNextM;
+        if (slab->nOutM == 0) ReleaseSlabLocked(slab);
+        slab = next;
       }
     }
   }
+  lockM.Unlock();
 }
 
 VekMempool* VekMempool::Default() {
@@ -102,82 +256,225 @@ inline void VekMempool::RaiseHighWater() {
   }
 }
 
+// ---- slabs (under lockM) ----
+
+void VekMempool::LinkLocked(Slab*& list, Slab* slab) {
+  slab->pPrevM = nullptr;
+  slab->pNextM = list;
+  if (list != nullptr) list->pPrevM = slab;
+  list = slab;
+}
+
+void VekMempool::UnlinkLocked(Slab*& list, Slab* slab) {
+  if (slab->pPrevM != nullptr) {
+    slab->pPrevM->pNextM = slab->pNextM;
+  } else {
+    list = slab->pNextM;
+  }
+  if (slab->pNextM != nullptr) slab->pNextM->pPrevM = slab->pPrevM;
+}
+
+VekMempool::Slab* VekMempool::TakeSlabLocked(size_t c) {
+  Slab* slab = pSpareM;
+  if (slab != nullptr) {
+    pSpareM = slab->pNextM;
+    --nSpareM;
+  } else {
+    void* memory = std::aligned_alloc(kSlabBytes, kSlabBytes);
+    if (memory == nullptr) return nullptr;
+    if (!MarkSlab(memory, true)) {
+      std::free(memory);
+      return nullptr;
+    }
+    slab = new (memory) Slab;
+    nSlabM.fetch_add(1, std::memory_order_relaxed);
+  }
+  const ClassLayout& layout = kLayoutG.vLayoutM[c];
+  slab->pPoolM = this;
+  slab->pFreeM = nullptr;
+  slab->classM = static_cast<uint32_t>(c);
+  slab->nOutM = 0;
+  slab->carveOffsetM = layout.firstOffsetM;
+  slab->isUsedUpM = false;
+  Poison(reinterpret_cast<char*>(slab) + layout.firstOffsetM, kSlabBytes - layout.firstOffsetM);
+  LinkLocked(vRoomyM[c], slab);
+  return slab;
+}
+
+void VekMempool::ReleaseSlabLocked(Slab* slab) {
+  MarkSlab(slab, false);
+  Unpoison(slab, kSlabBytes);
+  std::free(slab);
+  nSlabM.fetch_sub(1, std::memory_order_relaxed);
+}
+
+void VekMempool::ReturnToSlabLocked(FreeNode* node) {
+  Slab* slab = SlabOf(node);
+  size_t c = slab->classM;
+  if (kIsRecyclingG) {
+    node->pNextM = slab->pFreeM;
+    slab->pFreeM = node;
+    if (slab->isUsedUpM) {
+      UnlinkLocked(vUsedUpM[c], slab);
+      LinkLocked(vRoomyM[c], slab);
+      slab->isUsedUpM = false;
+    }
+  }
+  if (--slab->nOutM != 0) return;
+  // Without recycling, a slab still being carved stays until it is used up.
+  if (!kIsRecyclingG && !slab->isUsedUpM) return;
+  UnlinkLocked(slab->isUsedUpM ? vUsedUpM[c] : vRoomyM[c], slab);
+  if (nSpareM < kSpareLimitG) {
+    slab->pNextM = pSpareM;
+    pSpareM = slab;
+    ++nSpareM;
+  } else {
+    ReleaseSlabLocked(slab);
+  }
+}
+
+bool VekMempool::Refill(Cache* cache, size_t c, uint32_t nWant) {
+  const ClassLayout& layout = kLayoutG.vLayoutM[c];
+  // The cache's list of the class is empty; the batch is appended to it in the order taken:
+  // blocks given back first (they are warm), then fresh ones in address order.
+  FreeNode* head = nullptr;
+  FreeNode** pTail = &head;
+  uint32_t got = 0;
+  lockM.Lock();
+  while (got < nWant) {
+    Slab* slab = vRoomyM[c];
+    if (slab == nullptr && (slab = TakeSlabLocked(c)) == nullptr) break;
+    while (got < nWant && slab->pFreeM != nullptr) {
+      FreeNode* node = slab->pFreeM;
+      slab->pFreeM = node->pNextM;
+      *pTail = node;
+      pTail = &node->pNextM;
+      ++slab->nOutM;
+      ++got;
+    }
+    uint32_t room = (layout.endOffsetM - slab->carveOffsetM) / layout.blockBytesM;
+    uint32_t k = room < nWant - got ? room : nWant - got;
+    char* next = reinterpret_cast<char*>(slab) + slab->carveOffsetM;
+    for (uint32_t i = 0; i < k; ++i, next += layout.blockBytesM) {
+      FreeNode* node = reinterpret_cast<FreeNode*>(next);
+      Unpoison(node, sizeof(FreeNode));
+      *pTail = node;
+      pTail = &node->pNextM;
+    }
+    slab->carveOffsetM += k * layout.blockBytesM;
+    slab->nOutM += k;
+    got += k;
+    if (slab->pFreeM == nullptr && slab->carveOffsetM == layout.endOffsetM) {
+      UnlinkLocked(vRoomyM[c], slab);
+      LinkLocked(vUsedUpM[c], slab);
+      slab->isUsedUpM = true;
+    }
+  }
+  lockM.Unlock();
+  *pTail = nullptr;
+  cache->vHeadM[c] = head;
+  cache->vCountM[c] += got;
+  return got != 0;
+}
+
+void VekMempool::Spill(Cache* cache, size_t c, uint32_t n) {
+  FreeNode* node = cache->vHeadM[c];
+  cache->vCountM[c] -= n;
+  lockM.Lock();
+  for (; n != 0; --n) {
+    FreeNode* next = node->pNextM;
+    ReturnToSlabLocked(node);
+    node = next;
+  }
+  lockM.Unlock();
+  cache->vHeadM[c] = node;
+}
+
+void VekMempool::SpillAll(Cache* cache) {
+  for (size_t c = 0; c < kNumClasses; ++c) {
+    if (cache->vCountM[c] != 0) Spill(cache, c, cache->vCountM[c]);
+  }
+}
+
+// ---- allocation ----
+
+// Without a cache, a single block comes straight from the slabs.
+__attribute__((noinline)) VekMempool::FreeNode* VekMempool::TakeOne(size_t c) {
+  Cache one;
+  return Refill(&one, c, 1) ? one.vHeadM[c] : nullptr;
+}
+
+// The calling thread's last cache (VekMempoolCache.cpp); the serial of its pool, 0 for none.
+extern __thread uint64_t tLastCacheSerialG __attribute__((tls_model("initial-exec"), visibility("hidden")));
+extern __thread VekMempool::Cache* tLastCacheG __attribute__((tls_model("initial-exec"), visibility("hidden")));
+
+inline VekMempool::Cache* VekMempool::ThreadCacheOf() {
+  return tLastCacheSerialG == serialM ? tLastCacheG : FindThreadCache();
+}
+
 void* VekMempool::MallocSmall(size_t nByte) {
   size_t c = ClassOf(nByte);
   bool isOwner = IsOwnerThread();
-  FreeNode* node = nullptr;
-  if (isOwner) {
-    node = vOwnerFreeM[c];
-    if (node == nullptr && sharedFreeBlocksM.load(std::memory_order_relaxed) != 0) {
-      // Take back what other threads freed in this class, all at once.
-      lockM.Lock();
-      node = vSharedFreeM[c];
-      vOwnerFreeCountM[c] = vSharedFreeCountM[c];
-      sharedFreeBlocksM.fetch_sub(vSharedFreeCountM[c], std::memory_order_relaxed);
-      vSharedFreeM[c] = nullptr;
-      vSharedFreeCountM[c] = 0;
-      lockM.Unlock();
-    }
-    if (node != nullptr) {
-      vOwnerFreeM[c] = node->pNextM;
-      --vOwnerFreeCountM[c];
-    }
-  } else if (sharedFreeBlocksM.load(std::memory_order_relaxed) != 0) {
-    lockM.Lock();
-    node = vSharedFreeM[c];
-    if (node != nullptr) {
-      vSharedFreeM[c] = node->pNextM;
-      --vSharedFreeCountM[c];
-      sharedFreeBlocksM.fetch_sub(1, std::memory_order_relaxed);
-    }
-    lockM.Unlock();
-  }
-  char* payload;
-  if (node != nullptr) {
-    payload = reinterpret_cast<char*>(node);
+  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
+  FreeNode* node;
+  if (cache != nullptr) {
+    if (cache->vHeadM[c] == nullptr && !Refill(cache, c, CacheLimitOf(c) / 2)) return nullptr;
+    node = cache->vHeadM[c];
+    cache->vHeadM[c] = node->pNextM;
+    --cache->vCountM[c];
   } else {
-    char* raw = static_cast<char*>(std::malloc(sizeof(BlockHeader) + (c + 1) * kClassGranularity));
-    if (raw == nullptr) return nullptr;
-    payload = raw + sizeof(BlockHeader);
+    node = TakeOne(c);
+    if (node == nullptr) return nullptr;
   }
+  Slab* slab = SlabOf(node);
+  SlackOf(slab, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
+  Poison(node, kLayoutG.vLayoutM[c].blockBytesM);
+  Unpoison(node, nByte);
   Count(isOwner, nByte, 1);
   RaiseHighWater();
-  BlockHeader* header = HeaderOf(payload);
-  header->nByteM = nByte;
-  header->pPoolM = this;
-  return payload;
+  return node;
 }
 
-void VekMempool::FreeSmall(void* p, size_t nByte) {
-  size_t c = ClassOf(nByte);
-  size_t classBytes = (c + 1) * kClassGranularity;
-  FreeNode* node = static_cast<FreeNode*>(p);
+void VekMempool::FreeSmall(Slab* slab, void* p) {
+  assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
+  size_t c = slab->classM;
   bool isOwner = IsOwnerThread();
-  Count(isOwner, 0 - nByte, 0 - size_t{1});
-  if (!kIsRecyclingG) {
-    std::free(HeaderOf(p));
+  Count(isOwner, 0 - SmallSizeOf(slab, p), 0 - size_t{1});
+  Poison(p, kLayoutG.vLayoutM[c].blockBytesM);
+  FreeNode* node = static_cast<FreeNode*>(p);
+  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
+  if (cache == nullptr) {
+    lockM.Lock();
+    ReturnToSlabLocked(node);
+    lockM.Unlock();
     return;
   }
-  if (isOwner) {
-    if ((vOwnerFreeCountM[c] + 1) * classBytes <= kMaxCachedBytesPerClass) {
-      node->pNextM = vOwnerFreeM[c];
-      vOwnerFreeM[c] = node;
-      ++vOwnerFreeCountM[c];
-      return;
-    }
-  } else {
-    lockM.Lock();
-    bool isCached = (vSharedFreeCountM[c] + 1) * classBytes <= kMaxCachedBytesPerClass;
-    if (isCached) {
-      node->pNextM = vSharedFreeM[c];
-      vSharedFreeM[c] = node;
-      ++vSharedFreeCountM[c];
-      sharedFreeBlocksM.fetch_add(1, std::memory_order_relaxed);
-    }
-    lockM.Unlock();
-    if (isCached) return;
-  }
-  std::free(HeaderOf(p));
+  node->pNextM = cache->vHeadM[c];
+  cache->vHeadM[c] = node;
+  if (++cache->vCountM[c] >= CacheLimitOf(c)) Spill(cache, c, CacheLimitOf(c) / 2);
+}
+
+void* VekMempool::MallocLarge(size_t nByte) {
+  if (nByte > SIZE_MAX - sizeof(LargeHeader)) return nullptr;
+  LargeHeader* header = static_cast<LargeHeader*>(std::malloc(sizeof(LargeHeader) + nByte));
+  if (header == nullptr) return nullptr;
+  header->nByteM = nByte;
+  header->pPoolM = this;
+  Count(IsOwnerThread(), nByte, 1);
+  RaiseHighWater();
+  return header + 1;
+}
+
+void* VekMempool::ReallocLarge(void* p, size_t nByte) {
+  if (nByte > SIZE_MAX - sizeof(LargeHeader)) return nullptr;
+  size_t old = HeaderOf(p)->nByteM;
+  // The C library grows a large block in place, or moves its pages, instead of copying.
+  LargeHeader* header = static_cast<LargeHeader*>(std::realloc(HeaderOf(p), sizeof(LargeHeader) + nByte));
+  if (header == nullptr) return nullptr;
+  header->nByteM = nByte;
+  Count(IsOwnerThread(), nByte - old, 0);
+  if (nByte > old) RaiseHighWater();
+  return header + 1;
 }
 
 bool VekMempool::IsFailingForTest() {
@@ -189,16 +486,7 @@ bool VekMempool::IsFailingForTest() {
 
 void* VekMempool::Malloc(size_t nByte) {
   if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
-  if (nByte <= kMaxSmallBlock) return MallocSmall(nByte);
-  if (nByte > SIZE_MAX - sizeof(BlockHeader)) return nullptr;
-  char* raw = static_cast<char*>(std::malloc(sizeof(BlockHeader) + nByte));
-  if (raw == nullptr) return nullptr;
-  Count(IsOwnerThread(), nByte, 1);
-  RaiseHighWater();
-  BlockHeader* header = reinterpret_cast<BlockHeader*>(raw);
-  header->nByteM = nByte;
-  header->pPoolM = this;
-  return raw + sizeof(BlockHeader);
+  return nByte <= kMaxSmallBlock ? MallocSmall(nByte) : MallocLarge(nByte);
 }
 
 void* VekMempool::Calloc(size_t nByte) {
@@ -215,12 +503,17 @@ void* VekMempool::Calloc(size_t count, size_t size) {
 void* VekMempool::Realloc(void* p, size_t nByte) {
   if (p == nullptr) return Malloc(nByte);
   if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
-  size_t old = HeaderOf(p)->nByteM;
-  // Stay in place while the block's size class still fits.
-  if (old <= kMaxSmallBlock && nByte <= kMaxSmallBlock && ClassOf(old) == ClassOf(nByte)) {
+  bool isSmall = IsSlabAddress(p);
+  if (!isSmall && nByte > kMaxSmallBlock) return ReallocLarge(p, nByte);
+  size_t old = SizeOf(p);
+  if (isSmall && nByte <= kMaxSmallBlock && ClassOf(nByte) == SlabOf(p)->classM) {
+    // Stay in place while the block's size class still fits.
+    Slab* slab = SlabOf(p);
+    SlackOf(slab, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
+    Poison(p, kLayoutG.vLayoutM[slab->classM].blockBytesM);
+    Unpoison(p, nByte);
     Count(IsOwnerThread(), nByte - old, 0);
     if (nByte > old) RaiseHighWater();
-    HeaderOf(p)->nByteM = nByte;
     return p;
   }
   void* q = Malloc(nByte);
@@ -232,15 +525,19 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
 
 void VekMempool::Free(void* p) {
   if (p == nullptr) return;
-  BlockHeader* header = HeaderOf(p);
-  assert(header->pPoolM == this && "block freed to a pool that did not allocate it");
-  size_t nByte = header->nByteM;
-  if (nByte <= kMaxSmallBlock) {
-    FreeSmall(p, nByte);
+  if (IsSlabAddress(p)) {
+    FreeSmall(SlabOf(p), p);
     return;
   }
-  Count(IsOwnerThread(), 0 - nByte, 0 - size_t{1});
+  LargeHeader* header = HeaderOf(p);
+  assert(header->pPoolM == this && "block freed to a pool that did not allocate it");
+  Count(IsOwnerThread(), 0 - header->nByteM, 0 - size_t{1});
   std::free(header);
+}
+
+void VekMempool::Trim() {
+  Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
+  if (cache != nullptr) SpillAll(cache);
 }
 
 size_t VekMempool::GetUsedBytes() const {
@@ -253,6 +550,12 @@ size_t VekMempool::GetLiveBlocks() const {
   return ownerLiveM.load(std::memory_order_relaxed) + sharedLiveM.load(std::memory_order_relaxed);
 }
 
-VekMempool* VekMempool::PoolOf(const void* p) { return p == nullptr ? nullptr : HeaderOf(p)->pPoolM; }
+VekMempool* VekMempool::PoolOf(const void* p) {
+  if (p == nullptr) return nullptr;
+  return IsSlabAddress(p) ? SlabOf(p)->pPoolM : HeaderOf(p)->pPoolM;
+}
 
-size_t VekMempool::SizeOf(const void* p) { return p == nullptr ? 0 : HeaderOf(p)->nByteM; }
+size_t VekMempool::SizeOf(const void* p) {
+  if (p == nullptr) return 0;
+  return IsSlabAddress(p) ? SmallSizeOf(SlabOf(p), p) : HeaderOf(p)->nByteM;
+}

@@ -1,25 +1,35 @@
 // VekMempool: a named memory pool. Every allocation of the library names one.
 //
 // A pool keeps exact accounting of the bytes its callers asked for (GetUsedBytes) and of its
-// live blocks, and the highest figure the used bytes reached (GetUsedBytesHighWater). Small
-// blocks (up to 512 bytes) are recycled through per-size-class free lists kept in the pool;
-// larger blocks go straight to malloc. Each free list holds at most kMaxCachedBytesPerClass
-// bytes; beyond that a freed block goes back to the C library, so a pool never keeps more
-// than a bounded amount of memory for reuse. Builds with AddressSanitizer recycle nothing, so
-// that a use after free inside a pool is caught.
+// live blocks, and the highest figure the used bytes reached (GetUsedBytesHighWater).
+//
+// Small blocks (up to 512 bytes, in size classes of 16 bytes) are carved from slabs of 64 KiB
+// that the pool takes from the system, aligned to their size so that a block's slab (and with
+// it the pool, the size class and the size asked for) is found from the block's address: small
+// blocks carry no header. A slab holds blocks of one class, handed out in address order and
+// taken back through the slab's own free list. Each thread keeps a small cache of free blocks
+// per pool and class in front of the slabs (bounded; see kCacheBytesPerClass), so that the
+// common path of Malloc and Free takes no lock. A slab whose blocks are all free goes back to
+// the system, beyond a reserve of kFreeSlabReserve wholly free slabs per pool; every slab goes
+// back when the pool is destroyed. Larger blocks come from the C library with a 16-byte header
+// and grow with its realloc, which moves pages rather than bytes for large blocks.
+//
+// Builds with AddressSanitizer recycle nothing: a freed small block is poisoned and never
+// handed out again, and a slab goes back to the system as soon as it is used up and all its
+// blocks are free, so that a use after free inside a pool is caught.
 //
 // Thread safety: every member may be called from any thread at once (an object may be made on
-// one thread and released on another). The thread that constructed the pool takes a lock-free
-// path: its free lists and counters are its own. Other threads share a second set of free
-// lists under a spin lock and count with atomic additions; a block freed on another thread
-// reaches the owner's lists when the owner runs short. Used bytes and live blocks are exact
-// whenever the threads' calls are ordered (by a join, a lock, an atomic hand-off). The high
-// water is exact for allocations so ordered; two allocations racing on different threads may
-// each miss the other's bytes.
+// one thread and released on another). The thread that constructed the pool counts with plain
+// stores and keeps its cache in the pool; any other thread counts with atomic additions and
+// gets a cache of its own on its first call, handed back to the pool when the thread ends or
+// the pool is destroyed. Caches refill from and spill to the slabs in batches under a spin
+// lock. Used bytes and live blocks are exact whenever the threads' calls are ordered (by a
+// join, a lock, an atomic hand-off). The high water is exact for allocations so ordered; two
+// allocations racing on different threads may each miss the other's bytes.
 //
 // A pool must outlive every block allocated from it; destroying a pool that still has live
-// blocks reports them on standard error and, in builds without NDEBUG, asserts. Destroying it
-// must not race with any other call on it.
+// blocks reports them on standard error and, in builds without NDEBUG, asserts (the slabs that
+// hold those blocks stay allocated). Destroying it must not race with any other call on it.
 #pragma once
 
 #include <atomic>
@@ -42,20 +52,26 @@ class VekMempool {
   void* Malloc(size_t nByte);
   void* Calloc(size_t nByte);
   void* Calloc(size_t count, size_t size);
-  // Keeps the first min(old, new) bytes; Realloc(nullptr, n) is Malloc(n).
+  // Keeps the first min(old, new) bytes; Realloc(nullptr, n) is Malloc(n). On failure returns
+  // null and leaves the block as it was.
   void* Realloc(void* p, size_t nByte);
   // Free(nullptr) does nothing. The block must come from this pool.
   void Free(void* p);
+  // Hands the calling thread's cached free blocks back to the slabs, so that wholly free slabs
+  // beyond the reserve go back to the system (after a burst, say).
+  void Trim();
 
-  // Bytes requested by live blocks (headers and rounding not counted).
+  // Bytes requested by live blocks (rounding to the size class and headers not counted).
   size_t GetUsedBytes() const;
   size_t GetUsedBytesHighWater() const;
   size_t GetLiveBlocks() const;
+  // Slabs the pool holds from the system: in use, in reserve, or used up.
+  size_t GetSlabCount() const { return nSlabM.load(std::memory_order_relaxed); }
   const char* GetName() const { return nameM; }
 
-  // The pool a block was allocated from (recorded in the block's header).
+  // The pool a block was allocated from.
   static VekMempool* PoolOf(const void* p);
-  // The size the caller asked for when the block was allocated.
+  // The size the caller asked for when the block was allocated (or last reallocated).
   static size_t SizeOf(const void* p);
 
   // Test hook: after `n` more allocations succeed (Malloc, Calloc, Realloc), the next one fails
@@ -68,40 +84,77 @@ class VekMempool {
   static constexpr size_t kMaxSmallBlock = 512;
   static constexpr size_t kClassGranularity = 16;
   static constexpr size_t kNumClasses = kMaxSmallBlock / kClassGranularity;
-  static constexpr size_t kMaxCachedBytesPerClass = 1 << 20;
+  static constexpr size_t kSlabBytes = size_t{1} << 16;
+  static constexpr size_t kFreeSlabReserve = 1;
+  // What one thread's cache holds at most per class (at least 16 and at most 256 blocks).
+  static constexpr size_t kCacheBytesPerClass = 8192;
 
- private:
   struct FreeNode {
     FreeNode* pNextM;
   };
+  // Free blocks of one pool held by one thread, per class, in front of the slabs.
+  struct Cache {
+    FreeNode* vHeadM[kNumClasses] = {};
+    uint32_t vCountM[kNumClasses] = {};
+  };
+  struct Slab;
+  struct ThreadCache;
+
+ private:
   bool IsOwnerThread() const;
   bool IsFailingForTest();
+  void* MallocLarge(size_t nByte);
+  void* ReallocLarge(void* p, size_t nByte);
   void* MallocSmall(size_t nByte);
-  void FreeSmall(void* p, size_t nByte);
+  FreeNode* TakeOne(size_t c);
+  void FreeSmall(Slab* slab, void* p);
   // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the count
   // of the calling thread's side.
   void Count(bool isOwner, size_t nByte, size_t nBlock);
   void RaiseHighWater();
 
+  // The slabs, under lockM. Refill moves up to `nWant` blocks of class `c` to the cache and
+  // returns false when not one could be had; Spill gives `n` of the cache's blocks back.
+  bool Refill(Cache* cache, size_t c, uint32_t nWant);
+  void Spill(Cache* cache, size_t c, uint32_t n);
+  void SpillAll(Cache* cache);
+  void ReturnToSlabLocked(FreeNode* node);
+  Slab* TakeSlabLocked(size_t c);
+  void ReleaseSlabLocked(Slab* slab);
+  void LinkLocked(Slab*& list, Slab* slab);
+  void UnlinkLocked(Slab*& list, Slab* slab);
+
+  // The calling thread's cache for this pool (VekMempoolCache.cpp): null when none can be had
+  // (out of memory, or the thread is ending), and then the caller goes to the slabs directly.
+  // A thread remembers its last cache by the pool's serial number, which no later pool reuses.
+  Cache* ThreadCacheOf();
+  Cache* FindThreadCache();
+  void DetachThreadCaches();
+
   char nameM[64];
+  uint64_t serialM;
   const void* pOwnerM;
   std::atomic<long> failCountdownM{-1};
 
-  // The owner thread's side: lists touched by it alone; counters written by it alone (a load
-  // and a store, no locked instruction) and read by anyone.
-  FreeNode* vOwnerFreeM[kNumClasses] = {};
-  uint32_t vOwnerFreeCountM[kNumClasses] = {};
+  // The owner thread's side: its cache and its counters, written by it alone (a load and a
+  // store, no locked instruction) and read by anyone.
+  Cache ownerCacheM;
   std::atomic<size_t> ownerUsedM{0};
   std::atomic<size_t> ownerLiveM{0};
 
-  // Everyone else's side, on its own cache lines so that it does not slow the owner down.
-  alignas(64) mutable VekSpinLock lockM;
-  std::atomic<size_t> sharedFreeBlocksM{0};  // blocks on the shared lists: lets the owner skip the lock
-  FreeNode* vSharedFreeM[kNumClasses] = {};
-  uint32_t vSharedFreeCountM[kNumClasses] = {};
+  // Everyone else's counters, on their own cache line so that they do not slow the owner down.
   alignas(64) std::atomic<size_t> sharedUsedM{0};
   std::atomic<size_t> sharedLiveM{0};
   std::atomic<size_t> highWaterM{0};
+
+  // The slabs: per class, those with a free block or room to carve one, and those without.
+  alignas(64) VekSpinLock lockM;
+  Slab* vRoomyM[kNumClasses] = {};
+  Slab* vUsedUpM[kNumClasses] = {};
+  Slab* pSpareM = nullptr;  // wholly free slabs in reserve, at most kFreeSlabReserve
+  size_t nSpareM = 0;
+  std::atomic<size_t> nSlabM{0};
+  ThreadCache* pThreadCachesM = nullptr;  // under the process-wide lock of the thread caches
 };
 
 // Passed where the platform asks which subsystem uses a pool; recorded nowhere here.

@@ -1,13 +1,26 @@
 // Pools: exact accounting through every allocation path, from one thread and from several,
-// and the report of a pool destroyed with live blocks.
+// slabs taken and given back, thread caches handed back, large blocks growing in place, and
+// the report of a pool destroyed with live blocks.
+#include <algorithm>
 #include <atomic>
 #include <cstring>
+#include <future>
+#include <random>
 #include <thread>
 #include <vector>
 
+#include "sarn/Sarn.h"
 #include "testutil/TestUtil.h"
 
 namespace {
+
+#if defined(__SANITIZE_ADDRESS__)
+constexpr bool kIsRecycling = false;  // no caches; slabs go back as soon as they are used up and free
+#else
+constexpr bool kIsRecycling = true;
+#endif
+
+uintptr_t SlabBase(const void* p) { return reinterpret_cast<uintptr_t>(p) & ~(VekMempool::kSlabBytes - 1); }
 
 using MempoolTest = sarntest::PoolTest;
 
@@ -130,6 +143,156 @@ TEST_F(MempoolTest, AccountingIsExactAcrossThreads) {
   EXPECT_EQ(poolM.GetLiveBlocks(), 0u);
   EXPECT_GE(poolM.GetUsedBytesHighWater(), ownerBytes + otherBytes);
 }
+
+// Sizes that vary inside one class, so that every block's size is its own: allocating until a
+// third slab is taken, the counts are exact at every step, in address order within a slab, and
+// so are PoolOf and SizeOf at a slab's first and last block; freeing in random order brings
+// them back to zero and, once the cache is handed back, leaves one slab (the reserve, or the
+// slab still being carved where nothing is recycled).
+TEST_F(MempoolTest, SlabsAreCarvedInAddressOrderAndGivenBack) {
+  for (size_t classBytes : {16u, 48u, 512u}) {
+    VekMempool pool("slabs");
+    std::vector<void*> blocks;
+    size_t used = 0;
+    while (pool.GetSlabCount() < 3) {
+      size_t size = classBytes - blocks.size() % 16;
+      void* p = pool.Malloc(size);
+      ASSERT_NE(p, nullptr);
+      std::memset(p, 0x5a, size);
+      if (!blocks.empty() && SlabBase(p) == SlabBase(blocks.back())) {
+        ASSERT_GT(p, blocks.back()) << "address order, class " << classBytes;
+      }
+      blocks.push_back(p);
+      used += size;
+      ASSERT_EQ(pool.GetUsedBytes(), used);
+    }
+    ASSERT_EQ(pool.GetLiveBlocks(), blocks.size());
+    size_t last = 0;  // the last block of the first slab
+    while (SlabBase(blocks[last + 1]) == SlabBase(blocks[0])) ++last;
+    uintptr_t lastEnd = reinterpret_cast<uintptr_t>(blocks[last]) + classBytes;
+    EXPECT_LE(lastEnd, SlabBase(blocks[0]) + VekMempool::kSlabBytes);
+    EXPECT_GT(lastEnd + classBytes, SlabBase(blocks[0]) + VekMempool::kSlabBytes) << "no room for one more";
+    for (size_t i : {size_t{0}, last, last + 1, blocks.size() - 1}) {
+      EXPECT_EQ(VekMempool::PoolOf(blocks[i]), &pool) << classBytes << " block " << i;
+      EXPECT_EQ(VekMempool::SizeOf(blocks[i]), classBytes - i % 16) << classBytes << " block " << i;
+    }
+    std::shuffle(blocks.begin(), blocks.end(), std::mt19937(static_cast<unsigned>(classBytes)));
+    for (void* p : blocks) {
+      used -= VekMempool::SizeOf(p);
+      pool.Free(p);
+      ASSERT_EQ(pool.GetUsedBytes(), used);
+    }
+    EXPECT_EQ(pool.GetLiveBlocks(), 0u);
+    pool.Trim();
+    EXPECT_EQ(pool.GetSlabCount(), 1u) << classBytes;
+  }
+}
+
+// A block made on one thread and freed on another, in both directions (the pool's owner and a
+// thread with a cache of its own): the counts are exact after each join.
+TEST_F(MempoolTest, BlocksFreedOnTheOtherThreadAreCountedExactly) {
+  constexpr size_t kBlocks = 3000;
+  for (bool isOwnerFirst : {true, false}) {
+    std::vector<void*> blocks(kBlocks);
+    auto make = [&] {
+      for (size_t i = 0; i < kBlocks; ++i) blocks[i] = poolM.Malloc(i % 600);
+    };
+    auto release = [&] {
+      for (void* p : blocks) poolM.Free(p);
+    };
+    if (isOwnerFirst) {
+      make();
+    } else {
+      std::thread(make).join();
+    }
+    EXPECT_EQ(poolM.GetLiveBlocks(), kBlocks);
+    EXPECT_EQ(poolM.GetUsedBytes(), 5 * (599 * 600 / 2)) << "0..599 five times";
+    if (isOwnerFirst) {
+      std::thread(release).join();
+    } else {
+      release();
+    }
+    EXPECT_EQ(poolM.GetLiveBlocks(), 0u);
+    EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+  }
+}
+
+// A thread's cache goes back to the pool when the thread ends (its slab then is wholly free and
+// beyond the reserve), and a pool destroyed while a live thread caches its blocks takes them
+// back without a report; the thread then ends without touching the pool.
+TEST(MempoolThreadTest, CachesAreHandedBackWhenTheThreadOrThePoolEnds) {
+  if (!kIsRecycling) GTEST_SKIP() << "nothing is cached where nothing is recycled";
+  auto* pool = new VekMempool("handed-back");
+  std::promise<void> freed, mayEnd;
+  std::thread worker([&] {
+    std::vector<void*> blocks;
+    while (pool->GetSlabCount() < 2) blocks.push_back(pool->Malloc(512));
+    for (void* p : blocks) pool->Free(p);
+    freed.set_value();
+    mayEnd.get_future().wait();
+  });
+  freed.get_future().wait();
+  EXPECT_EQ(pool->GetLiveBlocks(), 0u);
+  EXPECT_EQ(pool->GetSlabCount(), 2u) << "the cache holds blocks of both slabs";
+  mayEnd.set_value();
+  worker.join();
+  EXPECT_EQ(pool->GetSlabCount(), 1u);
+
+  std::promise<void> cached, poolGone;
+  std::thread holder([&] {
+    pool->Free(pool->Malloc(100));
+    cached.set_value();
+    poolGone.get_future().wait();
+  });
+  cached.get_future().wait();
+  testing::internal::CaptureStderr();
+  delete pool;
+  EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
+  poolGone.set_value();
+  holder.join();
+}
+
+// Large blocks grow with realloc: every byte written survives each step (a fifth at a time, past
+// the size where the C library maps pages of its own), and the counts follow exactly.
+TEST_F(MempoolTest, LargeBlocksGrowKeepingTheirBytes) {
+  size_t size = 600;
+  unsigned char* p = static_cast<unsigned char*>(poolM.Malloc(size));
+  for (size_t i = 0; i < size; ++i) p[i] = static_cast<unsigned char>(i * 7);
+  while (size < (5u << 20)) {
+    size_t grown = size + size / 5;
+    p = static_cast<unsigned char*>(poolM.Realloc(p, grown));
+    ASSERT_NE(p, nullptr);
+    for (size_t i = 0; i < size; i += 997) ASSERT_EQ(p[i], static_cast<unsigned char>(i * 7)) << size;
+    ASSERT_EQ(p[size - 1], static_cast<unsigned char>((size - 1) * 7));
+    for (size_t i = size; i < grown; ++i) p[i] = static_cast<unsigned char>(i * 7);
+    size = grown;
+    ASSERT_EQ(poolM.GetUsedBytes(), size);
+    ASSERT_EQ(VekMempool::SizeOf(p), size);
+  }
+  EXPECT_EQ(poolM.GetUsedBytesHighWater(), size) << "growing in place holds one block at a time";
+  EXPECT_EQ(poolM.GetLiveBlocks(), 1u);
+  poolM.Free(p);
+}
+
+// The explicit form names the argument type; a named (not temporary) argument must bind.
+TEST_F(MempoolTest, MempoolNewTakesANamedArgumentOfTheNamedType) {
+  ref<sarn::Dictionary> dictionary = new (&poolM) sarn::Dictionary();
+  ref<sarn::Dict> dict = MempoolNew<sarn::Dict, ref<sarn::Dictionary>>(&poolM, dictionary);
+  ASSERT_TRUE(dict);
+  EXPECT_EQ(dict->GetDictionary().Get(), dictionary.Get());
+}
+
+#if defined(__SANITIZE_ADDRESS__)
+TEST(MempoolDeathTest, UseAfterFreeOfAPoolBlockIsCaught) {
+  VekMempool pool("poisoned");
+  volatile char* p = static_cast<char*>(pool.Malloc(48));
+  pool.Free(pool.Malloc(48));  // keeps the slab in use
+  void* keep = pool.Malloc(48);
+  pool.Free(const_cast<char*>(p));
+  EXPECT_DEATH(p[3] = 1, "use-after-poison");
+  pool.Free(keep);
+}
+#endif
 
 TEST(MempoolDeathTest, PoolDestroyedWithLiveBlocksIsReported) {
   [[maybe_unused]] const char* message = "VekMempool 'leaky' destroyed with 2 live blocks \\(40 bytes\\)";
