@@ -54,14 +54,13 @@ struct DictionaryFrameData {
 class DictionarySarnObject::Builder {
  public:
   using FrameData = DictionaryFrameData;
-  using Walk = internal::ObjectWalk<Builder>;
+  using Walk = internal::ObjectWalk<Builder, internal::WalkVersions::OLDER_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   explicit Builder(DictionarySarnObject& converter)
       : converterM(converter),
-        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM),
-              internal::WalkVersions::OLDER_RECORDS) {}
+        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM)) {}
 
   Walk& GetWalk() { return walkM; }
   ref<Dictionary>& Result() { return resultM; }
