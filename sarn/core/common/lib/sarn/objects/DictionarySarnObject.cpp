@@ -91,7 +91,8 @@ class DictionarySarnObject::Builder {
 
   bool Value(Frame& frame, unsigned i, Child& child) {
     const FieldInfo& field = *frame.pFieldM;
-    if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
+    // A lazy payload is kept as it is (shared, not converted); other objects become dictionaries.
+    if (TraitsOf(field.dataType).fHoldsObjects && field.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
       child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
       child.versionM = frame.versionM;
       return true;
