@@ -62,14 +62,14 @@ struct JsonFrameData {
 class JsonSarnObject::Writer {
  public:
   using FrameData = JsonFrameData;
-  using Walk = internal::ObjectWalk<Writer>;
+  using Walk = internal::ObjectWalk<Writer, internal::WalkVersions::CURRENT_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   Writer(JsonSarnObject& json, ByteBuffer& out)
       : jsonM(json),
         outM(out),
-        walkM(json.pMempoolM, json.pStructDefsM, json.nStructDefsM, internal::WalkVersions::CURRENT_RECORDS) {}
+        walkM(json.pMempoolM, json.pStructDefsM, json.nStructDefsM) {}
 
   Walk& GetWalk() { return walkM; }
 

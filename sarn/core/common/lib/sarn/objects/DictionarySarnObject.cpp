@@ -61,14 +61,13 @@ struct DictionaryFrameData {
 class DictionarySarnObject::Builder {
  public:
   using FrameData = DictionaryFrameData;
-  using Walk = internal::ObjectWalk<Builder>;
+  using Walk = internal::ObjectWalk<Builder, internal::WalkVersions::OLDER_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   explicit Builder(DictionarySarnObject& converter)
       : converterM(converter),
-        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM),
-              internal::WalkVersions::OLDER_RECORDS) {}
+        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM)) {}
 
   Walk& GetWalk() { return walkM; }
   ref<Dictionary>& Result() { return resultM; }
@@ -110,7 +109,8 @@ class DictionarySarnObject::Builder {
   bool Value(Frame& frame, unsigned i, Child& child) {
     if (wasOutOfMemoryM) return false;
     const FieldInfo& field = *frame.pFieldM;
-    if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
+    // A lazy payload is kept as it is (shared, not converted); other objects become dictionaries.
+    if (TraitsOf(field.dataType).fHoldsObjects && field.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
       child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
       child.versionM = frame.versionM;
       return true;
