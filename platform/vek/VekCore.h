@@ -163,9 +163,9 @@ class nonRef {
 static_assert(sizeof(ref<VekCore>) == sizeof(void*), "ref<T> is one pointer");
 static_assert(sizeof(nonRef<VekCore>) == sizeof(void*), "nonRef<T> is one pointer");
 
-// Allocates a T in `pool` from one constructor argument; null when memory runs out. The
-// argument is taken by constant reference so that the explicit form
-// MempoolNew<Dict, ref<Dictionary>>(pool, dictionary) accepts a named argument.
+// Allocates a T in `pool` from one constructor argument; null when memory runs out. The argument
+// is taken by constant reference so that the explicit form MempoolNew<Dict, ref<Dictionary>>(pool,
+// dictionary) accepts a named argument.
 template <class T, class A>
 ref<T> MempoolNew(VekMempool* pool, const A& arg) {
   return ref<T>(new (pool) T(arg));

@@ -49,38 +49,25 @@ inline size_t ClassOf(size_t nByte) {
   return nByte == 0 ? 0 : (nByte - 1) / VekMempool::kClassGranularity;
 }
 
-// Where the blocks of a class lie in a slab: the 64-byte slab header, one byte per block (the
-// block's size class minus the size asked for), then the blocks from a 16-byte boundary. A
-// block's index is its offset divided by the block size; offsets are exact multiples of it, so
-// the division is a shift and a multiplication by the inverse of the odd factor modulo 2^32.
+// Where the blocks of a class lie in a slab: the 64-byte slab header, then one byte for each 16
+// bytes of the slab (the size class minus the size asked for, in the byte of the block's first
+// 16), then the blocks. The byte of the block at offset o is at offset o / 16, which is past the
+// header for every block, so finding it takes a shift and no division by the block size.
 constexpr uint32_t kSlabHeaderBytes = 64;
+constexpr uint32_t kFirstBlockOffset = kSlabHeaderBytes + VekMempool::kSlabBytes / VekMempool::kClassGranularity;
 
 struct ClassLayout {
   uint32_t blockBytesM;
-  uint32_t firstOffsetM;  // offset of block 0 in the slab
-  uint32_t endOffsetM;    // one past the last whole block
-  uint32_t shiftM;
-  uint32_t inverseM;
+  uint32_t endOffsetM;   // one past the last whole block
+  uint32_t cacheLimitM;  // what a cache holds of the class before it spills half back to the slabs
 };
-
-constexpr uint32_t RoundUp16(uint32_t n) { return (n + 15) & ~uint32_t{15}; }
 
 constexpr ClassLayout MakeLayout(uint32_t c) {
   uint32_t blockBytes = (c + 1) * VekMempool::kClassGranularity;
-  uint32_t slabBytes = VekMempool::kSlabBytes;
-  uint32_t n = (slabBytes - kSlabHeaderBytes) / (blockBytes + 1);
-  while (RoundUp16(kSlabHeaderBytes + n + 1) + (n + 1) * blockBytes <= slabBytes) ++n;
-  while (RoundUp16(kSlabHeaderBytes + n) + n * blockBytes > slabBytes) --n;
-  uint32_t shift = 4;
-  uint32_t odd = c + 1;
-  while ((odd & 1) == 0) {
-    odd >>= 1;
-    ++shift;
-  }
-  uint32_t inverse = odd;  // Newton's iteration doubles the correct low bits each step
-  for (int i = 0; i < 5; ++i) inverse *= 2 - odd * inverse;
-  uint32_t first = RoundUp16(kSlabHeaderBytes + n);
-  return ClassLayout{blockBytes, first, first + n * blockBytes, shift, inverse};
+  uint32_t n = (VekMempool::kSlabBytes - kFirstBlockOffset) / blockBytes;
+  uint32_t cacheLimit = static_cast<uint32_t>(VekMempool::kCacheBytesPerClass / blockBytes);
+  cacheLimit = cacheLimit < 16 ? 16 : cacheLimit > 256 ? 256 : cacheLimit;
+  return ClassLayout{blockBytes, kFirstBlockOffset + n * blockBytes, cacheLimit};
 }
 
 struct LayoutTable {
@@ -94,14 +81,9 @@ constexpr LayoutTable MakeLayoutTable() {
 }
 
 constexpr LayoutTable kLayoutG = MakeLayoutTable();
-static_assert(kLayoutG.vLayoutM[0].endOffsetM <= VekMempool::kSlabBytes, "blocks fit the slab");
-static_assert(kLayoutG.vLayoutM[2].inverseM * 3u == 1u, "inverse of the odd factor");
+static_assert(kFirstBlockOffset / VekMempool::kClassGranularity >= kSlabHeaderBytes, "size bytes follow the header");
 
-// What a cache holds of a class before it spills half back to the slabs.
-constexpr uint32_t CacheLimitOf(size_t c) {
-  size_t n = VekMempool::kCacheBytesPerClass / kLayoutG.vLayoutM[c].blockBytesM;
-  return static_cast<uint32_t>(n < 16 ? 16 : n > 256 ? 256 : n);
-}
+inline uint32_t CacheLimitOf(size_t c) { return kLayoutG.vLayoutM[c].cacheLimitM; }
 
 // Which 64 KiB stretches of the address space are slabs: one bit per stretch, in leaves of
 // 4 GiB made on first use and never freed. It tells a small block (in a slab, no header) from
@@ -166,17 +148,17 @@ inline VekMempool::Slab* SlabOf(const void* p) {
   return reinterpret_cast<VekMempool::Slab*>(reinterpret_cast<uintptr_t>(p) & ~(VekMempool::kSlabBytes - 1));
 }
 
-inline uint8_t& SlackOf(VekMempool::Slab* slab, const void* p) {
-  const ClassLayout& layout = kLayoutG.vLayoutM[slab->classM];
-  uint32_t offset = static_cast<uint32_t>(static_cast<const char*>(p) - reinterpret_cast<char*>(slab));
-  assert(offset >= layout.firstOffsetM && offset < layout.endOffsetM &&
-         (offset - layout.firstOffsetM) % layout.blockBytesM == 0 && "address inside a block");
-  uint32_t index = ((offset - layout.firstOffsetM) >> layout.shiftM) * layout.inverseM;
-  return reinterpret_cast<uint8_t*>(slab)[kSlabHeaderBytes + index];
+// The size byte of the block at `p`, in a slab of class `c`.
+inline uint8_t& SlackOf(VekMempool::Slab* slab, size_t c, const void* p) {
+  uintptr_t offset = reinterpret_cast<uintptr_t>(p) - reinterpret_cast<uintptr_t>(slab);
+  assert(offset >= kFirstBlockOffset && offset < kLayoutG.vLayoutM[c].endOffsetM &&
+         (offset - kFirstBlockOffset) % kLayoutG.vLayoutM[c].blockBytesM == 0 && "address inside a block");
+  (void)c;
+  return reinterpret_cast<uint8_t*>(slab)[offset / VekMempool::kClassGranularity];
 }
 
-inline size_t SmallSizeOf(VekMempool::Slab* slab, const void* p) {
-  return kLayoutG.vLayoutM[slab->classM].blockBytesM - SlackOf(slab, p);
+inline size_t SmallSizeOf(VekMempool::Slab* slab, size_t c, const void* p) {
+  return (c + 1) * VekMempool::kClassGranularity - SlackOf(slab, c, p);
 }
 
 }  // namespace
@@ -235,13 +217,18 @@ VekMempool* VekMempool::Default() {
 
 inline bool VekMempool::IsOwnerThread() const { return pOwnerM == &tThreadMarkerG; }
 
-inline void VekMempool::Count(bool isOwner, size_t nByte, size_t nBlock) {
-  if (isOwner) {
-    // Only the owner writes these, so a load and a store suffice (others only read them).
+inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
+  // Only one thread writes each of the plain counters, so a load and a store suffice (others
+  // only read them). The bytes of all other threads share one counter so that the high water
+  // is one sum away.
+  if (cache == &ownerCacheM) {
     ownerUsedM.store(ownerUsedM.load(std::memory_order_relaxed) + nByte, std::memory_order_relaxed);
-    ownerLiveM.store(ownerLiveM.load(std::memory_order_relaxed) + nBlock, std::memory_order_relaxed);
   } else {
     sharedUsedM.fetch_add(nByte, std::memory_order_relaxed);
+  }
+  if (cache != nullptr) {
+    cache->liveM.store(cache->liveM.load(std::memory_order_relaxed) + nBlock, std::memory_order_relaxed);
+  } else {
     sharedLiveM.fetch_add(nBlock, std::memory_order_relaxed);
   }
 }
@@ -289,14 +276,13 @@ VekMempool::Slab* VekMempool::TakeSlabLocked(size_t c) {
     slab = new (memory) Slab;
     nSlabM.fetch_add(1, std::memory_order_relaxed);
   }
-  const ClassLayout& layout = kLayoutG.vLayoutM[c];
   slab->pPoolM = this;
   slab->pFreeM = nullptr;
   slab->classM = static_cast<uint32_t>(c);
   slab->nOutM = 0;
-  slab->carveOffsetM = layout.firstOffsetM;
+  slab->carveOffsetM = kFirstBlockOffset;
   slab->isUsedUpM = false;
-  Poison(reinterpret_cast<char*>(slab) + layout.firstOffsetM, kSlabBytes - layout.firstOffsetM);
+  Poison(reinterpret_cast<char*>(slab) + kFirstBlockOffset, kSlabBytes - kFirstBlockOffset);
   LinkLocked(vRoomyM[c], slab);
   return slab;
 }
@@ -412,10 +398,14 @@ inline VekMempool::Cache* VekMempool::ThreadCacheOf() {
   return tLastCacheSerialG == serialM ? tLastCacheG : FindThreadCache();
 }
 
+inline VekMempool::Cache* VekMempool::KnownCacheOf() {
+  if (IsOwnerThread()) return &ownerCacheM;
+  return tLastCacheSerialG == serialM ? tLastCacheG : nullptr;
+}
+
 void* VekMempool::MallocSmall(size_t nByte) {
   size_t c = ClassOf(nByte);
-  bool isOwner = IsOwnerThread();
-  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
+  Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
   FreeNode* node;
   if (cache != nullptr) {
     if (cache->vHeadM[c] == nullptr && !Refill(cache, c, CacheLimitOf(c) / 2)) return nullptr;
@@ -427,10 +417,10 @@ void* VekMempool::MallocSmall(size_t nByte) {
     if (node == nullptr) return nullptr;
   }
   Slab* slab = SlabOf(node);
-  SlackOf(slab, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
+  SlackOf(slab, c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
   Poison(node, kLayoutG.vLayoutM[c].blockBytesM);
   Unpoison(node, nByte);
-  Count(isOwner, nByte, 1);
+  Count(cache, nByte, 1);
   RaiseHighWater();
   return node;
 }
@@ -438,11 +428,10 @@ void* VekMempool::MallocSmall(size_t nByte) {
 void VekMempool::FreeSmall(Slab* slab, void* p) {
   assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
   size_t c = slab->classM;
-  bool isOwner = IsOwnerThread();
-  Count(isOwner, 0 - SmallSizeOf(slab, p), 0 - size_t{1});
+  Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
+  Count(cache, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
   Poison(p, kLayoutG.vLayoutM[c].blockBytesM);
   FreeNode* node = static_cast<FreeNode*>(p);
-  Cache* cache = !kIsRecyclingG ? nullptr : isOwner ? &ownerCacheM : ThreadCacheOf();
   if (cache == nullptr) {
     lockM.Lock();
     ReturnToSlabLocked(node);
@@ -460,7 +449,7 @@ void* VekMempool::MallocLarge(size_t nByte) {
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
   header->pPoolM = this;
-  Count(IsOwnerThread(), nByte, 1);
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte, 1);
   RaiseHighWater();
   return header + 1;
 }
@@ -472,7 +461,7 @@ void* VekMempool::ReallocLarge(void* p, size_t nByte) {
   LargeHeader* header = static_cast<LargeHeader*>(std::realloc(HeaderOf(p), sizeof(LargeHeader) + nByte));
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
-  Count(IsOwnerThread(), nByte - old, 0);
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
   if (nByte > old) RaiseHighWater();
   return header + 1;
 }
@@ -486,7 +475,19 @@ bool VekMempool::IsFailingForTest() {
 
 void* VekMempool::Malloc(size_t nByte) {
   if (failCountdownM.load(std::memory_order_relaxed) >= 0 && IsFailingForTest()) return nullptr;
-  return nByte <= kMaxSmallBlock ? MallocSmall(nByte) : MallocLarge(nByte);
+  if (nByte > kMaxSmallBlock) return MallocLarge(nByte);
+  // The common case (a block in the thread's cache), kept free of calls so that it needs no
+  // saved registers; everything else is MallocSmall's.
+  size_t c = ClassOf(nByte);
+  Cache* cache = KnownCacheOf();
+  FreeNode* node;
+  if (!kIsRecyclingG || cache == nullptr || (node = cache->vHeadM[c]) == nullptr) return MallocSmall(nByte);
+  cache->vHeadM[c] = node->pNextM;
+  --cache->vCountM[c];
+  SlackOf(SlabOf(node), c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
+  Count(cache, nByte, 1);
+  RaiseHighWater();
+  return node;
 }
 
 void* VekMempool::Calloc(size_t nByte) {
@@ -509,10 +510,10 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
   if (isSmall && nByte <= kMaxSmallBlock && ClassOf(nByte) == SlabOf(p)->classM) {
     // Stay in place while the block's size class still fits.
     Slab* slab = SlabOf(p);
-    SlackOf(slab, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
+    SlackOf(slab, slab->classM, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
     Poison(p, kLayoutG.vLayoutM[slab->classM].blockBytesM);
     Unpoison(p, nByte);
-    Count(IsOwnerThread(), nByte - old, 0);
+    Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
     if (nByte > old) RaiseHighWater();
     return p;
   }
@@ -526,12 +527,25 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
 void VekMempool::Free(void* p) {
   if (p == nullptr) return;
   if (IsSlabAddress(p)) {
-    FreeSmall(SlabOf(p), p);
+    Slab* slab = SlabOf(p);
+    size_t c = slab->classM;
+    FreeNode* node = static_cast<FreeNode*>(p);
+    Cache* cache = KnownCacheOf();
+    if (!kIsRecyclingG || cache == nullptr || cache->vCountM[c] + 1 >= CacheLimitOf(c)) {
+      FreeSmall(slab, p);
+      return;
+    }
+    // The common case, as in Malloc.
+    assert(slab->pPoolM == this && "block freed to a pool that did not allocate it");
+    Count(cache, 0 - SmallSizeOf(slab, c, p), 0 - size_t{1});
+    node->pNextM = cache->vHeadM[c];
+    cache->vHeadM[c] = node;
+    ++cache->vCountM[c];
     return;
   }
   LargeHeader* header = HeaderOf(p);
   assert(header->pPoolM == this && "block freed to a pool that did not allocate it");
-  Count(IsOwnerThread(), 0 - header->nByteM, 0 - size_t{1});
+  Count(IsOwnerThread() ? &ownerCacheM : nullptr, 0 - header->nByteM, 0 - size_t{1});
   std::free(header);
 }
 
@@ -546,9 +560,6 @@ size_t VekMempool::GetUsedBytes() const {
 
 size_t VekMempool::GetUsedBytesHighWater() const { return highWaterM.load(std::memory_order_relaxed); }
 
-size_t VekMempool::GetLiveBlocks() const {
-  return ownerLiveM.load(std::memory_order_relaxed) + sharedLiveM.load(std::memory_order_relaxed);
-}
 
 VekMempool* VekMempool::PoolOf(const void* p) {
   if (p == nullptr) return nullptr;
@@ -557,5 +568,5 @@ VekMempool* VekMempool::PoolOf(const void* p) {
 
 size_t VekMempool::SizeOf(const void* p) {
   if (p == nullptr) return 0;
-  return IsSlabAddress(p) ? SmallSizeOf(SlabOf(p), p) : HeaderOf(p)->nByteM;
+  return IsSlabAddress(p) ? SmallSizeOf(SlabOf(p), SlabOf(p)->classM, p) : HeaderOf(p)->nByteM;
 }

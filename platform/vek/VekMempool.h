@@ -20,12 +20,13 @@
 //
 // Thread safety: every member may be called from any thread at once (an object may be made on
 // one thread and released on another). The thread that constructed the pool counts with plain
-// stores and keeps its cache in the pool; any other thread counts with atomic additions and
-// gets a cache of its own on its first call, handed back to the pool when the thread ends or
-// the pool is destroyed. Caches refill from and spill to the slabs in batches under a spin
-// lock. Used bytes and live blocks are exact whenever the threads' calls are ordered (by a
-// join, a lock, an atomic hand-off). The high water is exact for allocations so ordered; two
-// allocations racing on different threads may each miss the other's bytes.
+// stores and keeps its cache in the pool. Any other thread gets a cache of its own on its first
+// call, handed back to the pool when the thread ends or the pool is destroyed; it counts its
+// blocks in its cache and adds its bytes to a counter shared by all such threads with an atomic
+// addition. Caches refill from and spill to the slabs in batches under a spin lock. Used bytes
+// and live blocks are exact whenever the threads' calls are ordered (by a join, a lock, an
+// atomic hand-off). The high water is exact for allocations so ordered; two allocations racing
+// on different threads may each miss the other's bytes.
 //
 // A pool must outlive every block allocated from it; destroying a pool that still has live
 // blocks reports them on standard error and, in builds without NDEBUG, asserts (the slabs that
@@ -96,6 +97,8 @@ class VekMempool {
   struct Cache {
     FreeNode* vHeadM[kNumClasses] = {};
     uint32_t vCountM[kNumClasses] = {};
+    // Blocks the thread allocated minus those it freed (modulo 2^64), written by it alone.
+    std::atomic<size_t> liveM{0};
   };
   struct Slab;
   struct ThreadCache;
@@ -108,9 +111,11 @@ class VekMempool {
   void* MallocSmall(size_t nByte);
   FreeNode* TakeOne(size_t c);
   void FreeSmall(Slab* slab, void* p);
-  // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the count
-  // of the calling thread's side.
-  void Count(bool isOwner, size_t nByte, size_t nBlock);
+  // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the counts
+  // of the calling thread: the owner's, those of the thread's cache, or (null) the shared ones.
+  void Count(Cache* cache, size_t nByte, size_t nBlock);
+  // The owner's cache or the calling thread's last cache when it is this pool's, else null.
+  Cache* KnownCacheOf();
   void RaiseHighWater();
 
   // The slabs, under lockM. Refill moves up to `nWant` blocks of class `c` to the cache and
@@ -136,13 +141,13 @@ class VekMempool {
   const void* pOwnerM;
   std::atomic<long> failCountdownM{-1};
 
-  // The owner thread's side: its cache and its counters, written by it alone (a load and a
-  // store, no locked instruction) and read by anyone.
+  // The owner thread's side: its cache (with its live blocks) and its bytes, written by it alone
+  // (a load and a store, no locked instruction) and read by anyone.
   Cache ownerCacheM;
   std::atomic<size_t> ownerUsedM{0};
-  std::atomic<size_t> ownerLiveM{0};
 
-  // Everyone else's counters, on their own cache line so that they do not slow the owner down.
+  // Everyone else's bytes, and the live blocks of threads without a cache (or whose cache was
+  // handed back), on their own cache line so that they do not slow the owner down.
   alignas(64) std::atomic<size_t> sharedUsedM{0};
   std::atomic<size_t> sharedLiveM{0};
   std::atomic<size_t> highWaterM{0};

@@ -72,6 +72,7 @@ void VekMempool::ThreadCache::HandBack(ThreadCache* head) {
     VekMempool* pool = head->pPoolM.load(std::memory_order_relaxed);
     if (pool != nullptr) {
       pool->SpillAll(head);
+      pool->sharedLiveM.fetch_add(head->liveM.load(std::memory_order_relaxed), std::memory_order_relaxed);
       head->UnlinkFromPool(pool);
     }
     CachesLock().Unlock();
@@ -119,10 +120,22 @@ void VekMempool::DetachThreadCaches() {
   for (ThreadCache* cache = pThreadCachesM; cache != nullptr;) {
     ThreadCache* next = cache->pNextInPoolM;
     SpillAll(cache);
+    sharedLiveM.fetch_add(cache->liveM.load(std::memory_order_relaxed), std::memory_order_relaxed);
     // From here on the cache is its thread's to free.
     cache->pPoolM.store(nullptr, std::memory_order_release);
     cache = next;
   }
   pThreadCachesM = nullptr;
   CachesLock().Unlock();
+}
+
+size_t VekMempool::GetLiveBlocks() const {
+  // The threads' own counts are read under the lock that keeps their caches from going away.
+  CachesLock().Lock();
+  size_t live = ownerCacheM.liveM.load(std::memory_order_relaxed) + sharedLiveM.load(std::memory_order_relaxed);
+  for (ThreadCache* cache = pThreadCachesM; cache != nullptr; cache = cache->pNextInPoolM) {
+    live += cache->liveM.load(std::memory_order_relaxed);
+  }
+  CachesLock().Unlock();
+  return live;
 }

@@ -14,8 +14,7 @@ std::string Bytes(const unsigned char* data, size_t n) { return std::string(rein
 
 TEST_F(ByteStringTest, VekByteStringZeroesNewBytesAndKeepsThePrefix) {
   ref<VekByteString> s = new (&poolM) VekByteString;
-  EXPECT_EQ(s->GetLength(), 0u);
-  EXPECT_EQ(s->GetData(), nullptr);
+  EXPECT_TRUE(s->GetLength() == 0 && s->GetData() == nullptr);
   ASSERT_TRUE(s->SetLength(4));
   EXPECT_EQ(Bytes(s->GetData(), 4), std::string(4, '\0'));
   s->SetBytes(1, 3, reinterpret_cast<const unsigned char*>("xyz"));
@@ -34,18 +33,15 @@ TEST_F(ByteStringTest, VekByteStringZeroesNewBytesAndKeepsThePrefix) {
 
 TEST_F(ByteStringTest, ByteBufferAppendsToExactlyTheNewLength) {
   ref<vek::ByteBuffer> empty = vek::ByteBuffer::New(&poolM);
-  EXPECT_EQ(empty->GetLength(), 0u);
-  EXPECT_EQ(empty->GetData(), nullptr);
   EXPECT_TRUE(empty->Append(nullptr, 0));
-  EXPECT_EQ(empty->GetCapacity(), 0u);
+  EXPECT_TRUE(empty->GetLength() == 0 && empty->GetData() == nullptr && empty->GetCapacity() == 0);
 
   ref<vek::ByteBuffer> b = vek::ByteBuffer::New(&poolM, "abc", 3);
   EXPECT_EQ(b->GetMempool(), &poolM);
   EXPECT_EQ(b->GetCapacity(), 8u) << "at least 8 bytes";
   ASSERT_TRUE(b->Append("defghijkl", 9));
-  EXPECT_EQ(b->GetLength(), 12u);
   EXPECT_EQ(b->GetCapacity(), 12u) << "exactly the new length";
-  EXPECT_EQ(Bytes(b->GetData(), 12), "abcdefghijkl");
+  EXPECT_EQ(Bytes(b->GetData(), b->GetLength()), "abcdefghijkl");
   // A length that would pass 2 GiB is refused before anything is touched.
   EXPECT_FALSE(b->Append("x", static_cast<size_t>(INT_MAX)));
   EXPECT_EQ(b->GetLength(), 12u);
@@ -73,8 +69,7 @@ TEST_F(ByteStringTest, DerivedClassGrowsTheStorageWithRealloc) {
   EXPECT_EQ(Bytes(g->GetData(), 3), std::string("pq\0", 3)) << "copied and zero-filled";
   EXPECT_FALSE(g->Reserve(1)) << "smaller than the length";
   EXPECT_FALSE(g->Reserve(-1));
-  EXPECT_EQ(g->GetCapacity(), 40u);
-  EXPECT_EQ(g->GetLength(), 2u);
+  EXPECT_TRUE(g->GetCapacity() == 40 && g->GetLength() == 2);
   ref<GrowingBuffer> nullPool = new (&poolM) GrowingBuffer(nullptr);
   EXPECT_EQ(nullPool->StoragePool(), &poolM) << "a null pool means the object's own";
 }

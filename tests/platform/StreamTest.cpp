@@ -35,8 +35,7 @@ TEST(StreamTest, InMemoryCopiesShareContentAndReadFromTheirOwnPosition) {
   EXPECT_EQ(ReadAll(*duplicate, 1), "llo world");
   EXPECT_EQ(ReadAll(stream, 4), "llo world");
   EXPECT_EQ(stream.Read(buffer, sizeof buffer), 0u) << "0 again after the end";
-  EXPECT_FALSE(stream.FError());
-  EXPECT_STREQ(stream.GetErrorText(), "");
+  EXPECT_TRUE(!stream.FError() && std::string(stream.GetErrorText()).empty());
 
   stream.Seek(6);
   EXPECT_EQ(ReadAll(stream, 16), "world");
@@ -50,10 +49,7 @@ TEST(StreamTest, InMemoryCopiesShareContentAndReadFromTheirOwnPosition) {
 TEST(StreamTest, CountingSinkCountsAndPassesOn) {
   InMemoryBytestream target;
   wynbaselib::ByteCountingBytesink counter(&target);
-  EXPECT_TRUE(counter.Write("abc", 3));
-  EXPECT_TRUE(counter.Write("", 0));
-  EXPECT_TRUE(counter.Write("de", 2));
-  EXPECT_TRUE(counter.Flush());
+  EXPECT_TRUE(counter.Write("abc", 3) && counter.Write("", 0) && counter.Write("de", 2) && counter.Flush());
   EXPECT_EQ(counter.GetCount(), 5u);
   EXPECT_EQ(target.GetContent(), "abcde");
   wynbaselib::ByteCountingBytesink alone;
@@ -77,8 +73,7 @@ TEST(StreamTest, FileDescriptorSourceAndSink) {
   wynbaselib::FdBytesource closed(fds[0]);
   char c;
   EXPECT_EQ(closed.Read(&c, 1), 0u);
-  EXPECT_TRUE(closed.FError());
-  EXPECT_STREQ(closed.GetErrorText(), "read error");
+  EXPECT_TRUE(closed.FError() && std::string(closed.GetErrorText()) == "read error");
   wynbaselib::FdBytesink broken(-1);
   EXPECT_FALSE(broken.Write("x", 1));
 }
@@ -101,8 +96,7 @@ class CountdownSource : public Bytesource {
 TEST(StreamTest, MinimalUserSourceGetsDefaultErrorQueries) {
   CountdownSource source(3);
   EXPECT_EQ(ReadAll(source, 4), "210");
-  EXPECT_FALSE(source.FError());
-  EXPECT_STREQ(source.GetErrorText(), "");
+  EXPECT_TRUE(!source.FError() && std::string(source.GetErrorText()).empty());
 }
 
 }  // namespace

@@ -7,10 +7,7 @@ namespace {
 
 using Base64Test = sarntest::PoolTest;
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
-std::string Str(const ref<vek::ByteBuffer>& bytes) {
-  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
-}
+using sarntest::Str;
 
 class Base64Pool : public Base64Test {
  protected:
@@ -35,22 +32,18 @@ class Base64Pool : public Base64Test {
 };
 
 TEST_F(Base64Pool, EncodesWithPaddingAndBothCodeSets) {
-  EXPECT_EQ(Encode(""), "");
-  EXPECT_EQ(Encode("f"), "Zg==");
-  EXPECT_EQ(Encode("fo"), "Zm8=");
-  EXPECT_EQ(Encode("foo"), "Zm9v");
-  EXPECT_EQ(Encode("foob"), "Zm9vYg==");
-  EXPECT_EQ(Encode("\xFB\xFF"), "+/8=");
+  std::string encoded;
+  for (const char* bytes : {"", "f", "fo", "foo", "foob", "\xFB\xFF"}) encoded += Encode(bytes) + "|";
+  EXPECT_EQ(encoded, "|Zg==|Zm8=|Zm9v|Zm9vYg==|+/8=|");
   std::string all;
   for (int i = 0; i < 256; ++i) all.push_back(static_cast<char>(i));
   EXPECT_EQ(Decode(Encode(all)), all);
 
   sarn::Base64 other(sarn::Base64::YAHOO_CODE_SET, sarn::Base64::YAHOO_TERMINATOR);
   EXPECT_FALSE(other.fBadCodeSetM);
-  ref<vek::ByteBuffer> text;
+  ref<vek::ByteBuffer> text, back;
   other.Encode(&poolM, Bytes("\xFB\xFF"), text);
   EXPECT_EQ(Str(text), "._8-");
-  ref<vek::ByteBuffer> back;
   ASSERT_TRUE(other.Decode(&poolM, text, back));
   EXPECT_EQ(Str(back), "\xFB\xFF");
   EXPECT_FALSE(other.Decode(&poolM, Bytes("+/8="), back)) << "the other code set's characters";
@@ -59,23 +52,13 @@ TEST_F(Base64Pool, EncodesWithPaddingAndBothCodeSets) {
 }
 
 TEST_F(Base64Pool, DecodeAcceptsPaddingOnlyAtTheEnd) {
-  EXPECT_EQ(Decode("Zm9v"), "foo");
-  EXPECT_EQ(Decode("Zm8="), "fo");
-  EXPECT_EQ(Decode("Zg=="), "f");
-  EXPECT_EQ(Decode(""), "");
-  EXPECT_EQ(Decode("Zg=x"), "f") << "the character after padding is not examined";
-  EXPECT_EQ(Decode("Zm8=Zg=="), "<fail>");
-  EXPECT_EQ(Decode("Zg==Zm9v"), "<fail>");
-  EXPECT_EQ(Decode("Zm9"), "<fail>");
-  EXPECT_EQ(Decode("Z!=="), "<fail>");
-  EXPECT_EQ(Decode("Z==="), "<fail>");
-  EXPECT_EQ(Decode("===="), "<fail>");
-  EXPECT_EQ(Decode("Zm9vZm8x"), "foofo1");
-  EXPECT_EQ(Decode("Zm9vZ!8x"), "<fail>");
-  EXPECT_EQ(Decode("Zm9vZm8"), "<fail>");
-  EXPECT_EQ(Decode(std::string("Zm\0v", 4)), "<fail>");
-  EXPECT_EQ(Decode("Zh=="), "f") << "unused low bits are ignored";
-  EXPECT_EQ(Decode("Zm9=x"), "<fail>");
+  // The character after padding is not examined; unused low bits are ignored.
+  const std::pair<std::string, const char*> cases[] = {
+      {"Zm9v", "foo"}, {"Zm8=", "fo"}, {"Zg==", "f"}, {"", ""}, {"Zg=x", "f"}, {"Zm8=Zg==", "<fail>"},
+      {"Zg==Zm9v", "<fail>"}, {"Zm9", "<fail>"}, {"Z!==", "<fail>"}, {"Z===", "<fail>"}, {"====", "<fail>"},
+      {"Zm9vZm8x", "foofo1"}, {"Zm9vZ!8x", "<fail>"}, {"Zm9vZm8", "<fail>"}, {std::string("Zm\0v", 4), "<fail>"},
+      {"Zh==", "f"}, {"Zm9=x", "<fail>"}};
+  for (const auto& [text, bytes] : cases) EXPECT_EQ(Decode(text), bytes) << text;
 }
 
 TEST_F(Base64Pool, BadCodeSetsAreRejected) {
@@ -118,12 +101,11 @@ TEST_F(Base64Pool, LargeRoundTripAllocatesOnlyTheResult) {
 }
 
 TEST_F(Base64Pool, ByteLists) {
-  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text("\x01\xAB"))), "01 AB ");
-  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text(std::string("\0\xFF", 2)))), "00 FF ");
-  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text(""))), "");
-  EXPECT_EQ(Str(sarn::FormatBytesFromBytestring(&poolM, Bytes("\x10"))), "10 ");
-  EXPECT_EQ(Str(sarn::FormatBytesFromBytestring(&poolM, ref<vek::ByteBuffer>())), "");
-
+  EXPECT_EQ(Str(sarn::FormatBytes(&poolM, Text("\x01\xAB"))) + "|" +
+                Str(sarn::FormatBytes(&poolM, Text(std::string("\0\xFF", 2)))) + "|" + Str(sarn::FormatBytes(&poolM, Text(""))) +
+                "|" + Str(sarn::FormatBytesFromBytestring(&poolM, Bytes("\x10"))) + "|" +
+                Str(sarn::FormatBytesFromBytestring(&poolM, ref<vek::ByteBuffer>())),
+            "01 AB |00 FF ||10 |");
   struct Case {
     std::string text;
     std::string bytes;

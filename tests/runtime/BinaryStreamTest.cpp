@@ -20,6 +20,13 @@ std::string Finished(ProtoBufByteOutputStream& stream) {
   return std::string(reinterpret_cast<const char*>(data), length);
 }
 
+// The varint of a section length, as Finish writes it.
+std::string Length(size_t n) {
+  std::string bytes;
+  for (; n >= 0x80; n >>= 7) bytes.push_back(static_cast<char>((n & 0x7F) | 0x80));
+  return bytes + static_cast<char>(n);
+}
+
 std::string Written(const std::function<void(ProtoBufByteOutputStream*)>& write) {
   ProtoBufByteOutputStream stream;
   write(&stream);
@@ -40,76 +47,70 @@ std::string FinishedScript(const std::string& script) {
 }  // namespace
 
 TEST(GoogleIntTest, WritersGiveExactBytes) {
-  using S = ProtoBufByteOutputStream;
-  struct Case {
-    std::function<void(S*)> write;
+  // 'u' and 'U' unsigned 32 and 64 bits, 's' and 'S' zig-zag signed.
+  const struct {
+    char kind;
+    unsigned long long value;
     std::string bytes;
   } cases[] = {
-      {[](S* s) { GoogleInt::WriteGoogleU32(0, s); }, std::string(1, '\0')},
-      {[](S* s) { GoogleInt::WriteGoogleU32(127, s); }, "\x7F"},
-      {[](S* s) { GoogleInt::WriteGoogleU32(128, s); }, "\x80\x01"},
-      {[](S* s) { GoogleInt::WriteGoogleU32(300, s); }, "\xAC\x02"},
-      {[](S* s) { GoogleInt::WriteGoogleU32(100, s); }, "d"},  // 0x64 as data survives its escape
-      {[](S* s) { GoogleInt::WriteGoogleU32(0xFFFFFFFF, s); }, "\xFF\xFF\xFF\xFF\x0F"},
-      {[](S* s) { GoogleInt::WriteGoogleU64(~0ull, s); }, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {[](S* s) { GoogleInt::WriteGoogleS32(-1, s); }, "\x01"},
-      {[](S* s) { GoogleInt::WriteGoogleS32(1, s); }, "\x02"},
-      {[](S* s) { GoogleInt::WriteGoogleS32(-2147483647 - 1, s); }, "\xFF\xFF\xFF\xFF\x0F"},
-      {[](S* s) { GoogleInt::WriteGoogleS64(-1 - 0x7FFFFFFFFFFFFFFFll, s); }, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {[](S* s) { GoogleInt::WriteGoogleS64(0x7FFFFFFFFFFFFFFFll, s); }, "\xFE\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+      {'u', 0, std::string(1, '\0')}, {'u', 127, "\x7F"}, {'u', 128, "\x80\x01"}, {'u', 300, "\xAC\x02"},
+      {'u', 100, "d"},  // 0x64 as data survives its escape
+      {'u', 0xFFFFFFFF, "\xFF\xFF\xFF\xFF\x0F"}, {'U', ~0ull, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+      {'s', static_cast<unsigned long long>(-1), "\x01"}, {'s', 1, "\x02"},
+      {'s', static_cast<unsigned long long>(-2147483647LL - 1), "\xFF\xFF\xFF\xFF\x0F"},
+      {'S', 1ull << 63, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
+      {'S', 0x7FFFFFFFFFFFFFFFull, "\xFE\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
   };
-  for (const Case& c : cases) EXPECT_EQ(Written(c.write), c.bytes) << testing::PrintToString(c.bytes);
+  for (const auto& c : cases) {
+    EXPECT_EQ(Written([&](ProtoBufByteOutputStream* s) {
+                switch (c.kind) {
+                  case 'u': return GoogleInt::WriteGoogleU32(static_cast<uint32_t>(c.value), s);
+                  case 'U': return GoogleInt::WriteGoogleU64(c.value, s);
+                  case 's': return GoogleInt::WriteGoogleS32(static_cast<int32_t>(c.value), s);
+                  default: return GoogleInt::WriteGoogleS64(static_cast<long long>(c.value), s);
+                }
+              }),
+              c.bytes)
+        << c.kind << " " << c.value;
+  }
+}
+
+// "ok value @bytes consumed", or "no" and what value and cursor were left at, for one reader.
+template <typename T>
+std::string ReadText(bool (*read)(const unsigned char**, const unsigned char*, T*), const std::string& bytes) {
+  const unsigned char* start = reinterpret_cast<const unsigned char*>(bytes.data());
+  const unsigned char* cursor = start;
+  T value = 77;
+  bool isOk = read(&cursor, start + bytes.size(), &value);
+  return (isOk ? "ok " : "no ") + std::to_string(value) + " @" + std::to_string(cursor - start);
 }
 
 TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
-  struct Case {
+  const std::string untouched = "no 77 @0";
+  const struct {
     std::string bytes;
-    bool isOk32;
-    unsigned long long value32;
-    bool isOk64;
-    unsigned long long value64;
-    size_t consumed;  // on success, both widths
+    std::string read32, read64;
   } cases[] = {
-      {"\x05rest", true, 5, true, 5, 1},
-      {"\xAC\x02", true, 300, true, 300, 2},
-      {"\xFF\xFF\xFF\xFF\x7F", true, 0xFFFFFFFF, true, 0x7FFFFFFFFull, 5},  // surplus bits dropped at 32
-      {"\x80\x80\x80\x80\x80\x01", false, 0, true, 1ull << 35, 6},          // six bytes: too long for 32
-      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", false, 0, true, ~0ull, 10},
-      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", false, 0, false, 0, 0},  // eleven bytes
-      {"\x80", false, 0, false, 0, 0},                                          // truncated
-      {"", false, 0, false, 0, 0},
+      {"\x05rest", "ok 5 @1", "ok 5 @1"},
+      {"\xAC\x02", "ok 300 @2", "ok 300 @2"},
+      {"\xFF\xFF\xFF\xFF\x7F", "ok 4294967295 @5", "ok 34359738367 @5"},  // surplus bits dropped at 32
+      {"\x80\x80\x80\x80\x80\x01", untouched, "ok 34359738368 @6"},       // six bytes: too long for 32
+      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", untouched, "ok 18446744073709551615 @10"},
+      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", untouched, untouched},  // eleven bytes
+      {"\x80", untouched, untouched},                                          // truncated
+      {"", untouched, untouched},
   };
-  for (const Case& c : cases) {
-    const unsigned char* start = reinterpret_cast<const unsigned char*>(c.bytes.data());
-    const unsigned char* end = start + c.bytes.size();
-    const unsigned char* cursor = start;
-    unsigned int value32 = 77;
-    EXPECT_EQ(GoogleInt::ReadGoogleU32(&cursor, end, &value32), c.isOk32) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(value32, c.isOk32 ? c.value32 : 77);
-    EXPECT_EQ(cursor, start + (c.isOk32 ? c.consumed : 0));
-    cursor = start;
-    unsigned long long value64 = 77;
-    EXPECT_EQ(GoogleInt::ReadGoogleU64(&cursor, end, &value64), c.isOk64) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(value64, c.isOk64 ? c.value64 : 77);
-    EXPECT_EQ(cursor, start + (c.isOk64 ? c.consumed : 0));
+  for (const auto& c : cases) {
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, c.bytes), c.read32) << testing::PrintToString(c.bytes);
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, c.bytes), c.read64) << testing::PrintToString(c.bytes);
   }
   // Every proper prefix of a varint is refused with cursor and value untouched.
   const std::string tenBytes = "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01";
-  for (size_t n = 0; n < tenBytes.size(); ++n) {
-    const unsigned char* start = reinterpret_cast<const unsigned char*>(tenBytes.data());
-    const unsigned char* cursor = start;
-    unsigned long long value = 77;
-    EXPECT_FALSE(GoogleInt::ReadGoogleU64(&cursor, start + n, &value)) << n;
-    EXPECT_TRUE(cursor == start && value == 77) << n;
-  }
+  for (size_t n = 0; n < tenBytes.size(); ++n) EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, tenBytes.substr(0, n)), untouched);
   // Zig-zag undone: even u is u / 2, odd u is ~(u >> 1).
-  const unsigned char signedBytes[] = {0x03, 0x04, 0xFF, 0xFF, 0xFF, 0xFF, 0x0F};
-  const unsigned char* cursor = signedBytes;
-  int s32 = 0;
-  long long s64 = 0;
-  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2);
-  EXPECT_TRUE(GoogleInt::ReadGoogleS64(&cursor, signedBytes + 7, &s64) && s64 == 2);
-  EXPECT_TRUE(GoogleInt::ReadGoogleS32(&cursor, signedBytes + 7, &s32) && s32 == -2147483647 - 1);
+  EXPECT_EQ(ReadText(GoogleInt::ReadGoogleS32, "\x03") + " " + ReadText(GoogleInt::ReadGoogleS64, "\x04") + " " +
+                ReadText(GoogleInt::ReadGoogleS32, "\xFF\xFF\xFF\xFF\x0F"),
+            "ok -2 @1 ok 2 @1 ok -2147483648 @5");
 }
 
 TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
@@ -129,12 +130,7 @@ TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
   for (const Case& c : cases) EXPECT_EQ(FinishedScript(c.script), c.bytes) << c.script;
   // Lengths at the varint's byte boundaries, and sections nested a thousand deep.
   for (size_t n : {size_t{127}, size_t{128}, size_t{16383}, size_t{16384}, size_t{1} << 21}) {
-    std::string length;
-    for (size_t v = n; ; v >>= 7) {
-      length.push_back(static_cast<char>((v & 0x7F) | (v >= 0x80 ? 0x80 : 0)));
-      if (v < 0x80) break;
-    }
-    EXPECT_EQ(FinishedScript("[" + std::string(n, 'x') + "]"), length + std::string(n, 'd')) << n;
+    EXPECT_EQ(FinishedScript("[" + std::string(n, 'x') + "]"), Length(n) + std::string(n, 'd')) << n;
   }
   std::string deep = FinishedScript(std::string(1000, '[') + "x" + std::string(1000, ']'));
   ASSERT_EQ(deep.size(), 1u + 127 + 873 * 2);  // the 127 innermost lengths take one byte, the rest two
@@ -154,11 +150,7 @@ TEST(ProtoBufByteOutputStreamTest, FinishMatchesAPlainEncoderOnRandomTrees) {
         stream.StartSection();
         std::string inner = writeTree(stream, depth + 1);
         stream.EndSection();
-        for (size_t n = inner.size(); ; n >>= 7) {
-          out.push_back(static_cast<char>((n & 0x7F) | (n >= 0x80 ? 0x80 : 0)));
-          if (n < 0x80) break;
-        }
-        out += inner;
+        out += Length(inner.size()) + inner;
       } else {
         static const unsigned char kBytes[] = {0x00, 0x01, 0x02, 0x64, 0x80, 0xFF};
         size_t run = random() % 300;  // long enough for two-byte lengths
@@ -199,8 +191,7 @@ TEST(ProtoBufByteOutputStreamTest, LengthsThatDoNotFitAreInserted) {
   ASSERT_FALSE(stream.IsOutOfMemory());
   ASSERT_EQ(length, 1 + 5 + 5 + n + 1);
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(data), 11), "a\x85\x80\x80\x80\x01\x80\x80\x80\x80\x01");
-  EXPECT_EQ(data[11], 0x64);
-  EXPECT_EQ(data[12], 'z');
-  EXPECT_EQ(data[11 + 251], 0x64);
-  EXPECT_EQ(data[length - 1], 'b');
+  EXPECT_EQ(std::string({static_cast<char>(data[11]), static_cast<char>(data[12]), static_cast<char>(data[11 + 251]),
+                         static_cast<char>(data[length - 1])}),
+            "dzdb");
 }

@@ -16,8 +16,7 @@ unsigned long Capacity(const sarn::ByteBuffer& buffer) { return buffer.bufferM.b
 
 TEST_F(ByteBufferTest, SingleBytesGrowByAtLeast256AndKeepASpareByte) {
   sarn::ByteBuffer buffer(&poolM);
-  EXPECT_EQ(Capacity(buffer), 0u);
-  EXPECT_EQ(buffer.GetLength(), 0u);
+  EXPECT_TRUE(Capacity(buffer) == 0 && buffer.GetLength() == 0);
   std::string expected;
   std::vector<unsigned long> capacities;
   for (int i = 0; i < 1100; ++i) {
@@ -55,9 +54,7 @@ TEST_F(ByteBufferTest, RunsGrowByTheirLengthPlusAFifth) {
 
 TEST_F(ByteBufferTest, AppendStringStopsAtTheNulAndRefusesImpossibleLengths) {
   sarn::ByteBuffer buffer(&poolM);
-  EXPECT_TRUE(buffer.AppendString("ab\0cd"));
-  EXPECT_TRUE(buffer.AppendString(nullptr));
-  EXPECT_TRUE(buffer.AppendString(""));
+  EXPECT_TRUE(buffer.AppendString("ab\0cd") && buffer.AppendString(nullptr) && buffer.AppendString(""));
   EXPECT_EQ(Contents(buffer), "ab");
   unsigned char byte = 1;
   EXPECT_FALSE(buffer.AppendBytes(&byte, ULONG_MAX)) << "a length that would wrap the capacity";
@@ -67,8 +64,7 @@ TEST_F(ByteBufferTest, AppendStringStopsAtTheNulAndRefusesImpossibleLengths) {
 
 TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
   ref<sarn::Vek1ByteBufferCore> core = new (&poolM) sarn::Vek1ByteBufferCore();
-  EXPECT_EQ(core->GetLength(), 0u);
-  EXPECT_EQ(core->GetCapacity(), 0u);
+  EXPECT_TRUE(core->GetLength() == 0 && core->GetCapacity() == 0);
   std::vector<size_t> capacities;
   for (int i = 0; i < 17; ++i) {
     size_t before = core->GetCapacity();
@@ -78,8 +74,7 @@ TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
   EXPECT_EQ(capacities, (std::vector<size_t>{8, 16, 32}));
   const unsigned char run[] = {'X', 'Y', 'Z'};
   ASSERT_TRUE(core->AppendBytes(run, 3));
-  EXPECT_EQ(core->GetLength(), 20u);
-  EXPECT_EQ(core->GetCapacity(), 20u) << "a run reallocates to exactly the new length";
+  EXPECT_TRUE(core->GetLength() == 20 && core->GetCapacity() == 20) << "a run reallocates to exactly the new length";
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(core->GetData()), core->GetLength()), "abcdefghijklmnopqXYZ");
   // Only the low 32 bits of a run's length count.
   EXPECT_TRUE(core->AppendBytes(run, 1ul << 32));
@@ -93,19 +88,16 @@ TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
 }
 
 TEST_F(ByteBufferTest, CoreEqualityComparesLengthAndBytes) {
-  ref<sarn::Vek1ByteBufferCore> a = new (&poolM) sarn::Vek1ByteBufferCore();
-  ref<sarn::Vek1ByteBufferCore> b = new (&poolM) sarn::Vek1ByteBufferCore();
-  EXPECT_TRUE(a->FEqual(b.Get()));
-  EXPECT_FALSE(a->FEqual(nullptr));
-  a->AppendBytes(reinterpret_cast<const unsigned char*>("abc"), 3);
-  b->AppendByte('a');
-  b->AppendByte('b');
-  EXPECT_FALSE(a->FEqual(b.Get()));
-  b->AppendByte('d');
-  EXPECT_FALSE(a->FEqual(b.Get()));
-  ref<sarn::Vek1ByteBufferCore> c = new (&poolM) sarn::Vek1ByteBufferCore();
-  c->AppendBytes(reinterpret_cast<const unsigned char*>("abc"), 3);
-  EXPECT_TRUE(a->FEqual(c.Get()));
+  std::vector<ref<sarn::Vek1ByteBufferCore>> cores;
+  for (const char* bytes : {"", "abc", "ab", "abd", "abc"}) {
+    cores.push_back(new (&poolM) sarn::Vek1ByteBufferCore());
+    for (const char* b = bytes; *b != 0; ++b) cores.back()->AppendByte(static_cast<unsigned char>(*b));
+  }
+  EXPECT_FALSE(cores[0]->FEqual(nullptr));
+  EXPECT_EQ(std::vector<bool>({cores[0]->FEqual(ref<sarn::Vek1ByteBufferCore>(new (&poolM) sarn::Vek1ByteBufferCore()).Get()),
+                               cores[1]->FEqual(cores[2].Get()), cores[1]->FEqual(cores[3].Get()),
+                               cores[1]->FEqual(cores[4].Get())}),
+            std::vector<bool>({true, false, false, true}));
 }
 
 }  // namespace

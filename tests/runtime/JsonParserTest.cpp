@@ -36,33 +36,24 @@ TEST_F(JsonParserTest, GivesOneTreeWhereverTheChunksSplit) {
   });
 }
 
-TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberText) {
+TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberTextAndReportsRefusals) {
   std::string error;
   ref<Dictionary> tree = Parse(&poolM, R"({"k": 1, "k": -0.5E-7, "k": {"k": []}})", &error);
   ASSERT_TRUE(tree) << error;
-  EXPECT_EQ(tree->CountValues(VekString("k")), 3u);
   EXPECT_EQ(Compact(tree), R"({"k": 1, "k": "-0.5E-7", "k": {"k": []}})");
-}
-
-TEST_F(JsonParserTest, ReportsRefusals) {
-  std::string error;
+  bool isOk;
   for (const char* input : {"[1,2]", "42", "\"s\"", "null"}) {
-    bool isOk;
-    ref<Dictionary> tree = Parse(&poolM, {std::string_view(input)}, &isOk, &error);
+    EXPECT_FALSE(Parse(&poolM, {std::string_view(input)}, &isOk, &error)) << input;
     EXPECT_FALSE(isOk) << input;
-    EXPECT_FALSE(tree) << input;
     EXPECT_EQ(error, "The JSON must start with a '{' character") << input;
   }
   // yajl's own words for syntax errors; the tree built so far is kept for the caller.
-  bool isOk;
   ref<Dictionary> partial = Parse(&poolM, {std::string_view(R"({"a":1,})")}, &isOk, &error);
   EXPECT_FALSE(isOk);
-  EXPECT_EQ(error, "parse error: invalid object key (must be a string)\n");
-  EXPECT_EQ(Compact(partial), R"({"a": 1})");
+  EXPECT_EQ(error + Compact(partial), "parse error: invalid object key (must be a string)\n{\"a\": 1}");
   for (const char* input : {"", "{\"a\"", "{a:1}", "{\"a\":tru}", "{\"a\":\"\xFF\"}", "{} {}", "{\"a\":1,}"}) {
     EXPECT_FALSE(Parse(&poolM, input, &error)) << input;
-    EXPECT_NE(error, "") << input;
-    EXPECT_NE(error, "The JSON must start with a '{' character") << input;
+    EXPECT_TRUE(error != "" && error != "The JSON must start with a '{' character") << input;
   }
   EXPECT_FALSE(Parse(&poolM, "", &error));
   EXPECT_EQ(error, "parse error: premature EOF\n") << "an empty text fails when the parse is ended";
@@ -123,45 +114,29 @@ TEST_F(JsonParserTest, RefusesContainersPastThePlatformCount) {
   EXPECT_EQ(error, "JSON object repeats a key more than 65535 times.");
 }
 
-// A source that counts its deletion and can end in an error.
-class TestSource : public wynbaselib::InMemoryBytestream {
- public:
-  TestSource(const std::string& text, bool* isDeleted, bool isFailing = false)
-      : InMemoryBytestream(text), pIsDeletedM(isDeleted), isFailingM(isFailing) {}
-  ~TestSource() override { *pIsDeletedM = true; }
-  bool FError() const override { return isFailingM; }
-  const char* GetErrorText() const override { return "truncated stream"; }
-
- private:
-  bool* pIsDeletedM;
-  bool isFailingM;
-};
-
 TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
   std::string json = "{\"list\": [";
   for (int i = 0; i < 3000; ++i) json += (i ? ", " : "") + std::string("{\"i\": ") + std::to_string(i) + "}";
   json += "]}";
-  bool isDeleted = false;
-  VekString error("untouched");
-  ref<Dictionary> tree = Dictionary::FromJsonBytesource(new TestSource(json, &isDeleted), error, &poolM);
-  EXPECT_TRUE(isDeleted);
-  EXPECT_EQ(Str(error), "untouched") << "success leaves the message as it was";
-  ASSERT_TRUE(tree);
-  EXPECT_TRUE(tree->Equals(Read(&poolM, json)));
-
-  isDeleted = false;
-  error = VekString();
-  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": [1, 2", &isDeleted), error, &poolM);
-  EXPECT_TRUE(isDeleted);
-  EXPECT_EQ(Str(error), "parse error: premature EOF\n");
-  EXPECT_EQ(Compact(tree), R"({"a": [1, 2]})") << "the partial tree is returned";
-
-  error = VekString();
-  tree = Dictionary::FromJsonBytesource(new TestSource("{\"a\": 1}", &isDeleted, true), error, &poolM);
-  EXPECT_EQ(Str(error), "Byte source error: truncated stream");
-  error = VekString();
-  EXPECT_FALSE(Dictionary::FromJsonBytesource(new TestSource("[]", &isDeleted), error, &poolM));
-  EXPECT_EQ(Str(error), "The JSON must start with a '{' character");
+  // Success leaves the message as it was; a failed parse returns the partial tree.
+  const struct {
+    std::string text;
+    bool isFailing;
+    std::string result;  // the message, then the compact tree
+  } cases[] = {
+      {json, false, "untouched " + Compact(Read(&poolM, json))},
+      {"{\"a\": [1, 2", false, "parse error: premature EOF\n {\"a\": [1, 2]}"},
+      {"{\"a\": 1}", true, "Byte source error: truncated stream {\"a\": 1}"},
+      {"[]", false, "The JSON must start with a '{' character (null)"},
+  };
+  for (const auto& c : cases) {
+    int deleted = 0;
+    VekString error("untouched");
+    ref<Dictionary> tree =
+        Dictionary::FromJsonBytesource(new sarntest::TestSource({c.text}, &deleted, c.isFailing), error, &poolM);
+    EXPECT_EQ(deleted, 1);
+    EXPECT_EQ(Str(error) + " " + Compact(tree), c.result);
+  }
 }
 
 TEST_F(JsonParserTest, StackAndEndingFollowTheirContracts) {

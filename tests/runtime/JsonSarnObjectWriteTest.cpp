@@ -1,7 +1,9 @@
 // The object-to-JSON writer: exact bytes for every data type, the place of "type", version
-// filtering at the edges of ranges, null references, and depth without limit.
+// filtering at the edges of ranges, null references, and depth without limit (also for the
+// binary writer, which walks objects the same way).
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -212,7 +214,10 @@ TEST_F(JsonWriteTest, LazyPayloadsWriteThemselvesAndObjectsTheirOwnVersion) {
   EXPECT_NE(Write(request, 42).find("\"text\": \"\", \"type\": \"error\", \"traceInfo\": {}}"), std::string::npos);
 }
 
-TEST_F(JsonWriteTest, ObjectsOfAnyDepthAreWritten) {
+// A chain of errors 100,000 deep, each the cause of the next, through both writers that walk
+// objects into bytes: exact lengths and both ends. With the writer's pool refusing the first
+// growth of the walk's stack, each reports the failure instead of writing on.
+TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
   const int kDepth = 100000;
   std::vector<ref<SarnObject>> chain;
   for (int i = 0; i < kDepth; ++i) {
@@ -220,14 +225,56 @@ TEST_F(JsonWriteTest, ObjectsOfAnyDepthAreWritten) {
     static_cast<sarnschema::Error*>(chain.back().Get())->codeM = 3;
     if (i > 0) static_cast<sarnschema::Error*>(chain[i - 1].Get())->causeM = chain.back();
   }
-  std::string json = Write(chain.front().Get(), 0);
+  auto varintLength = [](size_t n) { return n < 128 ? 1u : n < 16384 ? 2u : n < 2097152 ? 3u : 4u; };
+  struct Writer {
+    const char* label;
+    std::function<bool(VekMempool*, std::string&)> write;
+    size_t size;
+    std::string head, tail;
+  };
   // Fields in number order: code, debug, text, retryInterval, cause, traceInfo ("type" before it).
-  const std::string head = "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
-  const std::string last = "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
-  const std::string tail = ", \"type\": \"error\"}";
-  ASSERT_EQ(json.size(), (kDepth - 1) * (head.size() + tail.size()) + last.size());
-  EXPECT_EQ(json.compare(0, head.size(), head), 0);
-  EXPECT_EQ(json.compare(json.size() - tail.size(), tail.size(), tail), 0);
+  const std::string jsonHead = "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
+  const std::string jsonLast = "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
+  const std::string jsonTail = ", \"type\": \"error\"}";
+  // Binary: code (08 03), text (1A 00), then cause (2A) holding the known dict of type 346 (D2 15).
+  size_t fields = 4;
+  for (int i = 1; i < kDepth; ++i) {
+    size_t known = 2 + varintLength(fields) + fields;
+    fields = 4 + 1 + varintLength(known) + known;
+  }
+  const Writer writers[] = {
+      {"json",
+       [&](VekMempool* pool, std::string& text) {
+         JsonSarnObject json(pool);
+         ByteBuffer out(&poolM);
+         bool ok = json.SarnObjectToJson(chain.front().Get(), 0, out);
+         text.assign(reinterpret_cast<const char*>(out.GetData()), out.GetLength());
+         return ok;
+       },
+       (kDepth - 1) * (jsonHead.size() + jsonTail.size()) + jsonLast.size(), jsonHead, jsonTail},
+      {"binary",
+       [&](VekMempool* pool, std::string& bytes) {
+         ProtoBufByteOutputStream out;
+         ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG).MarshalKnownDict(chain.front().Get(), &out);
+         const unsigned char* data;
+         unsigned long length;
+         out.Finish(data, length);
+         bytes.assign(reinterpret_cast<const char*>(data), length);
+         return !out.IsOutOfMemory();
+       },
+       2 + varintLength(fields) + fields, "\xD2\x15", std::string("\xD2\x15\x04\x08\x03\x1A\x00", 7)},
+  };
+  for (const Writer& w : writers) {
+    std::string out;
+    ASSERT_TRUE(w.write(&poolM, out)) << w.label;
+    ASSERT_EQ(out.size(), w.size) << w.label;
+    EXPECT_EQ(out.compare(0, w.head.size(), w.head), 0) << w.label;
+    EXPECT_EQ(out.compare(out.size() - w.tail.size(), w.tail.size(), w.tail), 0) << w.label;
+    VekMempool failing("failing");
+    failing.FailAllocationAfter(0);
+    EXPECT_FALSE(w.write(&failing, out)) << w.label;
+    EXPECT_EQ(failing.GetUsedBytes(), 0u) << w.label;
+  }
   // Released from the top so that no destructor recurses through the chain.
   for (auto& link : chain) link.Reset();
 }

@@ -10,41 +10,8 @@ using JsonTextTest = sarntest::PoolTest;
 
 using sarntest::Str;
 
-// A source that delivers the given chunks, one per Read (a chunk larger than the request is
-// handed out in pieces).
-class ChunkSource : public wynbaselib::Bytesource {
- public:
-  explicit ChunkSource(std::vector<std::string_view> chunks) : chunksM(std::move(chunks)) {}
-  size_t Read(void* buffer, size_t size) override {
-    ++nReadM;
-    while (indexM < chunksM.size() && chunksM[indexM].empty()) ++indexM;
-    if (indexM == chunksM.size()) return 0;
-    std::string_view& chunk = chunksM[indexM];
-    size_t n = std::min(size, chunk.size());
-    std::memcpy(buffer, chunk.data(), n);
-    chunk.remove_prefix(n);
-    return n;
-  }
-  Bytesource* Duplicate() override { return nullptr; }
-  int nReadM = 0;
-
- private:
-  std::vector<std::string_view> chunksM;
-  size_t indexM = 0;
-};
-
-class StringSink : public wynbaselib::Bytesink {
- public:
-  bool Write(const char* data, size_t size) override {
-    textM.append(data, size);
-    ++nWriteM;
-    return !fFailM;
-  }
-  bool Flush() override { return true; }
-  std::string textM;
-  int nWriteM = 0;
-  bool fFailM = false;
-};
+using sarntest::StringSink;
+using ChunkSource = sarntest::TestSource;
 
 // Both writers, checked to agree.
 std::string ToJson(const std::string& text, bool fBareAllowed) {
@@ -110,6 +77,7 @@ struct ReadResult {
   bool fOk;
   std::string text;
   size_t consumed;  // bytes the cursor moved
+  std::string Text() const { return (fOk ? "ok [" : "no [") + text + "] " + std::to_string(consumed); }
 };
 
 ReadResult ReadMemory(VekMempool* pool, std::string_view input, VekHashStringToStringNew* intern = nullptr,
@@ -156,9 +124,7 @@ TEST_F(JsonTextTest, MemoryReaderStringsBareTokensAndFailures) {
   };
   for (const auto& c : cases) {
     ReadResult r = ReadMemory(&poolM, c.input);
-    EXPECT_EQ(r.fOk, c.fOk) << c.input;
-    EXPECT_EQ(r.text, c.text) << c.input;
-    EXPECT_TRUE(!c.fOk || r.consumed == c.consumed) << c.input << " consumed " << r.consumed;
+    EXPECT_EQ(r.Text(), (ReadResult{c.fOk, c.text, c.fOk ? c.consumed : r.consumed}.Text())) << c.input;
   }
 }
 
@@ -188,10 +154,7 @@ TEST_F(JsonTextTest, SourceReaderAgreesWithMemoryOnClosedStringsAtEverySplit) {
   for (const std::string& input : inputs) {
     ReadResult expected = ReadMemory(&poolM, input);
     sarntest::ForEachSplit(input, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
-      ReadResult r = ReadSource(&poolM, chunks);
-      EXPECT_EQ(r.fOk, expected.fOk) << input << " " << label;
-      EXPECT_EQ(r.text, expected.text) << input << " " << label;
-      EXPECT_EQ(r.consumed, expected.consumed) << input << " " << label;
+      EXPECT_EQ(ReadSource(&poolM, chunks).Text(), expected.Text()) << input << " " << label;
     });
   }
 }
@@ -202,16 +165,11 @@ TEST_F(JsonTextTest, SourceReaderIsStricterAtTheEnd) {
                                std::string_view("\"a\0\"", 4)}) {
     sarntest::ForEachSplit(bad, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
       ReadResult r = ReadSource(&poolM, chunks);
-      EXPECT_FALSE(r.fOk) << label;
-      EXPECT_EQ(r.text, "untouched");
+      EXPECT_TRUE(!r.fOk && r.text == "untouched") << label;
     });
   }
-  ReadResult r = ReadSource(&poolM, {std::string_view("ab\0cd", 5)});
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "ab") << "a NUL ends a bare token";
-  r = ReadSource(&poolM, {});
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "");
+  EXPECT_EQ(ReadSource(&poolM, {std::string_view("ab\0cd", 5)}).Text(), "ok [ab] 2") << "a NUL ends a bare token";
+  EXPECT_EQ(ReadSource(&poolM, {}).Text(), "ok [] 0");
 }
 
 TEST_F(JsonTextTest, QuotedStringStraddlesTheBlockBoundary) {
@@ -244,8 +202,7 @@ TEST_F(JsonTextTest, CursorOverMemoryNeverReadsItsSource) {
   sarn::InputPointerBytesource cursor(reinterpret_cast<const unsigned char*>(text), 4);
   EXPECT_EQ(cursor.BytesDelivered(), 4u);
   cursor.SkipWhitespace();
-  EXPECT_EQ(cursor.Peek(), 'x');
-  EXPECT_EQ(cursor.Next(), 'x');
+  EXPECT_EQ(std::string({cursor.Peek(), cursor.Next()}), "xx");
   EXPECT_EQ(cursor.Next(), 0);
   EXPECT_FALSE(cursor.Refill());
   EXPECT_EQ(cursor.BytesDelivered(), 4u);

@@ -57,41 +57,29 @@ void BridgeKnown(const SarnObject* object, Message* known) {
 void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, Message* out, const FieldDescriptor* fd) {
   const Reflection* r = out->GetReflection();
   const bool isMulti = fd->is_repeated();
+  auto put = [&](auto value, auto add, auto set) { isMulti ? (r->*add)(out, fd, value) : (r->*set)(out, fd, value); };
   auto text = [&](const VekString& s) {
-    std::string v(s.Utf8(), s.NByte());
-    isMulti ? r->AddString(out, fd, v) : r->SetString(out, fd, v);
+    put(std::string(s.Utf8(), s.NByte()), &Reflection::AddString, &Reflection::SetString);
   };
   switch (field.dataType) {
-    case SARN_DATA_TYPE_BOOL: {
-      bool v = FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0;
-      return isMulti ? r->AddBool(out, fd, v) : r->SetBool(out, fd, v);
-    }
+    case SARN_DATA_TYPE_BOOL:
+      return put(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0, &Reflection::AddBool, &Reflection::SetBool);
     case SARN_DATA_TYPE_DATE:
-    case SARN_DATA_TYPE_S32: {
-      int32_t v = FieldAccess::ScalarValue<int32_t>(object, field, i);
-      return isMulti ? r->AddInt32(out, fd, v) : r->SetInt32(out, fd, v);
-    }
+    case SARN_DATA_TYPE_S32:
+      return put(FieldAccess::ScalarValue<int32_t>(object, field, i), &Reflection::AddInt32, &Reflection::SetInt32);
     case SARN_DATA_TYPE_DATETIME:
-    case SARN_DATA_TYPE_S64: {
-      int64_t v = FieldAccess::ScalarValue<int64_t>(object, field, i);
-      return isMulti ? r->AddInt64(out, fd, v) : r->SetInt64(out, fd, v);
-    }
+    case SARN_DATA_TYPE_S64:
+      return put(FieldAccess::ScalarValue<int64_t>(object, field, i), &Reflection::AddInt64, &Reflection::SetInt64);
     case SARN_DATA_TYPE_ENUM:
     case SARN_DATA_TYPE_TIME:
     case SARN_DATA_TYPE_INT_ID:
-    case SARN_DATA_TYPE_U32: {
-      uint32_t v = FieldAccess::ScalarValue<uint32_t>(object, field, i);
-      return isMulti ? r->AddUInt32(out, fd, v) : r->SetUInt32(out, fd, v);
-    }
+    case SARN_DATA_TYPE_U32:
+      return put(FieldAccess::ScalarValue<uint32_t>(object, field, i), &Reflection::AddUInt32, &Reflection::SetUInt32);
     case SARN_DATA_TYPE_LONG_ID:
-    case SARN_DATA_TYPE_U64: {
-      uint64_t v = FieldAccess::ScalarValue<uint64_t>(object, field, i);
-      return isMulti ? r->AddUInt64(out, fd, v) : r->SetUInt64(out, fd, v);
-    }
-    case SARN_DATA_TYPE_FLOAT: {
-      double v = FieldAccess::ScalarValue<double>(object, field, i);
-      return isMulti ? r->AddDouble(out, fd, v) : r->SetDouble(out, fd, v);
-    }
+    case SARN_DATA_TYPE_U64:
+      return put(FieldAccess::ScalarValue<uint64_t>(object, field, i), &Reflection::AddUInt64, &Reflection::SetUInt64);
+    case SARN_DATA_TYPE_FLOAT:
+      return put(FieldAccess::ScalarValue<double>(object, field, i), &Reflection::AddDouble, &Reflection::SetDouble);
     case SARN_DATA_TYPE_CHANNEL_NUMBER: return text(FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
     case SARN_DATA_TYPE_CURRENCY: return text(FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
     case SARN_DATA_TYPE_STRING:
@@ -101,8 +89,8 @@ void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, M
   VekCore* value = FieldAccess::ReferenceAt(object, field, i);
   if (field.dataType == SARN_DATA_TYPE_BYTESTRING) {
     auto* bytes = static_cast<const vek::ByteBuffer*>(value);
-    std::string v(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
-    return isMulti ? r->AddString(out, fd, v) : r->SetString(out, fd, v);
+    return put(std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength()), &Reflection::AddString,
+               &Reflection::SetString);
   }
   Message* message = isMulti ? r->AddMessage(out, fd) : r->MutableMessage(out, fd);
   switch (field.dataType) {

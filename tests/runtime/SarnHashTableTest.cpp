@@ -1,6 +1,9 @@
+#include <algorithm>
 #include <atomic>
+#include <cstring>
 #include <cstdint>
 #include <memory>
+#include <random>
 #include <string>
 #include <thread>
 #include <vector>
@@ -12,44 +15,38 @@ namespace {
 
 using sarntest::Str;
 
-// Reference: lookup3's hashlittle written from its published description with the classic
-// mix/final macros, reading the key through 32-bit little-endian loads of a zero-padded copy.
-#define REF_ROT(x, k) (((x) << (k)) | ((x) >> (32 - (k))))
-#define REF_MIX(a, b, c) \
-  { a -= c; a ^= REF_ROT(c, 4); c += b; b -= a; b ^= REF_ROT(a, 6); a += c; \
-    c -= b; c ^= REF_ROT(b, 8); b += a; a -= c; a ^= REF_ROT(c, 16); c += b; \
-    b -= a; b ^= REF_ROT(a, 19); a += c; c -= b; c ^= REF_ROT(b, 4); b += a; }
-#define REF_FINAL(a, b, c) \
-  { c ^= b; c -= REF_ROT(b, 14); a ^= c; a -= REF_ROT(c, 11); b ^= a; b -= REF_ROT(a, 25); \
-    c ^= b; c -= REF_ROT(b, 16); a ^= c; a -= REF_ROT(c, 4); b ^= a; b -= REF_ROT(a, 14); \
-    c ^= b; c -= REF_ROT(b, 24); }
-
-uint32_t ReferenceHash(const std::string& key, bool mixEmptyKey) {
+// Reference: lookup3's hashlittle written from its published description, reading the key
+// through 32-bit little-endian loads of a zero-padded copy. Each round of mix and final is
+// x -= y, x ^= rot(y, k), y += z (mix) or x ^= y, x -= rot(y, k) (final) over rotating roles.
+uint32_t ReferenceHash(const std::string& key) {
+  auto rot = [](uint32_t x, int k) { return (x << k) | (x >> (32 - k)); };
   std::string padded = key + std::string(12, '\0');
-  auto word = [&](size_t at) {
-    uint32_t w;
-    std::memcpy(&w, padded.data() + at, 4);  // the test machine is little-endian
-    return w;
-  };
   uint32_t length = static_cast<uint32_t>(key.size());
-  uint32_t a, b, c;
-  a = b = c = 0xdeadbeef + length;
+  uint32_t v[3] = {0xdeadbeef + length, 0xdeadbeef + length, 0xdeadbeef + length};  // a, b, c
+  auto add = [&](size_t at, uint32_t n) {  // the next n <= 12 bytes into a, b and c
+    for (int i = 0; i < 3; ++i) {
+      uint32_t w;
+      std::memcpy(&w, padded.data() + at + 4 * i, 4);  // the test machine is little-endian
+      int bytes = std::max(0, std::min(4, static_cast<int>(n) - 4 * i));
+      v[i] += w & (bytes == 4 ? 0xffffffffu : (1u << (8 * bytes)) - 1);
+    }
+  };
   size_t at = 0;
-  while (length > 12) {
-    a += word(at);
-    b += word(at + 4);
-    c += word(at + 8);
-    REF_MIX(a, b, c);
-    length -= 12;
-    at += 12;
+  for (; length > 12; length -= 12, at += 12) {
+    add(at, 12);
+    const int kRot[] = {4, 6, 8, 16, 19, 4};
+    for (int i = 0; i < 6; ++i) {
+      uint32_t &x = v[i % 3], &y = v[(i + 2) % 3], &z = v[(i + 1) % 3];
+      x -= y, x ^= rot(y, kRot[i]), y += z;
+    }
   }
-  if (length == 0 && !mixEmptyKey) return c;
-  // The zero padding stands in for the masked tail.
-  a += word(at) & (length >= 4 ? 0xffffffffu : (1u << (8 * length)) - 1);
-  if (length > 4) b += word(at + 4) & (length >= 8 ? 0xffffffffu : (1u << (8 * (length - 4))) - 1);
-  if (length > 8) c += word(at + 8) & (length >= 12 ? 0xffffffffu : (1u << (8 * (length - 8))) - 1);
-  REF_FINAL(a, b, c);
-  return c;
+  add(at, length);  // the zero padding stands in for the masked tail
+  const int kRot[] = {14, 11, 25, 16, 4, 14, 24};
+  for (int i = 0; i < 7; ++i) {
+    uint32_t &x = v[(2 + i) % 3], &y = v[(1 + i) % 3];
+    x ^= y, x -= rot(y, kRot[i]);
+  }
+  return v[2];
 }
 
 uint32_t Hash(const std::string& key) {
@@ -58,20 +55,15 @@ uint32_t Hash(const std::string& key) {
 
 TEST(SarnHashTableUtilTest, HashMatchesTheReference) {
   EXPECT_EQ(Hash("Four score and seven years ago"), 0x17770551u) << "lookup3's published value";
-  EXPECT_EQ(Hash(""), ReferenceHash("", true));
-  EXPECT_NE(Hash(""), 0xdeadbeefu) << "the empty key is mixed";
-  EXPECT_EQ(ReferenceHash("", false), 0xdeadbeefu);
-  std::string bytes;
-  for (int i = 0; i < 40; ++i) bytes.push_back(static_cast<char>(0x80 + i * 37));
-  for (size_t n : {1, 11, 12, 13, 24, 25, 36, 37}) {
-    EXPECT_EQ(Hash(bytes.substr(0, n)), ReferenceHash(bytes.substr(0, n), true)) << n << " bytes";
-    EXPECT_EQ(Hash(std::string("abcdefghijklmnopqrstuvwxyz0123456789").substr(0, n)),
-              ReferenceHash(std::string("abcdefghijklmnopqrstuvwxyz0123456789").substr(0, n), true))
-        << n << " letters";
+  EXPECT_NE(Hash(""), 0xdeadbeefu) << "the empty key is mixed, unlike lookup3's";
+  // Every length up to three blocks and a bit, over random bytes (high bits included).
+  std::mt19937 random(5);
+  std::string key;
+  for (size_t n = 0; n <= 40; key.push_back(static_cast<char>(random())), ++n) {
+    EXPECT_EQ(Hash(key), ReferenceHash(key)) << n << " bytes";
   }
   EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash(nullptr), 0u);
-  const char* key = "address";
-  EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash(key), Hash("address"));
+  EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash("address"), Hash("address"));
 }
 
 // A small instantiation: 2 inline nodes, so blocks are exercised early.
@@ -90,78 +82,56 @@ class SarnHashTableTest : public sarntest::PoolTest {
   std::vector<std::string> keysM;
 };
 
-TEST_F(SarnHashTableTest, PutFindsAddsAndGrowsAtThe40thEntry) {
+TEST_F(SarnHashTableTest, PutFindsAddsAndGrowsAtTheLoadLimit) {
   static_assert(SmallTable::kNodesPerBlock == 6, "six 40-byte nodes after a 16-byte header");
   SmallTable table(&poolM);
+  auto shape = [&table] {
+    return std::to_string(table.nEntryM) + " in " + std::to_string(table.nBucketM) + " step " +
+           std::to_string(table.sizeIndexM) + (table.pBucketsM == table.inlineBucketsM ? " inline" : "");
+  };
   EXPECT_EQ(table.loadPercentM, 75);
   VekString* first = nullptr;
+  VekString* value = nullptr;
   EXPECT_FALSE(table.Put(keysM[0].c_str(), first));
-  ASSERT_NE(first, nullptr);
-  EXPECT_TRUE(first->FEmpty());
+  ASSERT_TRUE(first != nullptr && first->FEmpty());
   *first = VekString("zero");
   std::string sameContent = keysM[0];
-  VekString* again = nullptr;
-  EXPECT_TRUE(table.Put(sameContent.c_str(), again)) << "keys compare by content";
-  EXPECT_EQ(again, first);
-  for (int i = 1; i < 39; ++i) {
-    VekString* value;
-    ASSERT_FALSE(table.Put(keysM[i].c_str(), value));
-  }
-  EXPECT_EQ(table.nEntryM, 39);
-  EXPECT_EQ(table.nBucketM, 53) << "39 entries = 53 * 75 / 100 still fit";
-  EXPECT_EQ(table.pBucketsM, table.inlineBucketsM);
-  VekString* value;
+  EXPECT_TRUE(table.Put(sameContent.c_str(), value)) << "keys compare by content";
+  EXPECT_EQ(value, first);
+  // 53 * 75 / 100 = 39 entries fit the inline buckets, 769 * 75 / 100 = 576 the next step.
+  for (int i = 1; i < 39; ++i) ASSERT_FALSE(table.Put(keysM[i].c_str(), value));
+  EXPECT_EQ(shape(), "39 in 53 step 0 inline");
   EXPECT_FALSE(table.Put(keysM[39].c_str(), value));
-  EXPECT_EQ(table.nBucketM, 769);
-  EXPECT_EQ(table.sizeIndexM, 1);
-  EXPECT_NE(table.pBucketsM, table.inlineBucketsM);
+  EXPECT_EQ(shape(), "40 in 769 step 1");
   // Every entry survives the move to the new buckets, at the same address.
-  EXPECT_TRUE(table.Put(keysM[0].c_str(), again));
-  EXPECT_EQ(again, first);
-  EXPECT_EQ(Str(*again), "zero");
+  EXPECT_TRUE(table.Put(keysM[0].c_str(), value));
+  EXPECT_TRUE(value == first && Str(*value) == "zero");
   for (int i = 0; i < 40; ++i) ASSERT_TRUE(table.Put(keysM[i].c_str(), value)) << i;
-  // 769 * 75 / 100 = 576 entries before the next step.
   for (int i = 40; i < 576; ++i) table.Put(keysM[i].c_str(), value);
-  EXPECT_EQ(table.nBucketM, 769);
+  EXPECT_EQ(shape(), "576 in 769 step 1");
   table.Put(keysM[576].c_str(), value);
-  EXPECT_EQ(table.nBucketM, 3079);
-  EXPECT_EQ(table.sizeIndexM, 2);
-}
-
-TEST_F(SarnHashTableTest, NullKeyIsAKeyOfItsOwn) {
-  SmallTable table(&poolM);
-  VekString* a;
-  VekString* b;
-  EXPECT_FALSE(table.Put(nullptr, a));
-  EXPECT_FALSE(table.Put("", b));
-  EXPECT_NE(a, b);
-  EXPECT_TRUE(table.Put(nullptr, b));
-  EXPECT_EQ(a, b);
+  EXPECT_EQ(shape(), "577 in 3079 step 2");
+  // The null key is a key of its own, apart from the empty one.
+  VekString *null1, *null2, *empty;
+  EXPECT_FALSE(table.Put(nullptr, null1));
+  EXPECT_FALSE(table.Put("", empty));
+  EXPECT_TRUE(table.Put(nullptr, null2));
+  EXPECT_TRUE(null1 == null2 && null1 != empty);
 }
 
 TEST_F(SarnHashTableTest, BlocksAreTakenFromThePoolAndReturnedByClear) {
   SmallTable table(&poolM);
   VekString* value;
-  table.Put(keysM[0].c_str(), value);
-  table.Put(keysM[1].c_str(), value);
-  EXPECT_EQ(poolM.GetUsedBytes(), 0u) << "two inline nodes";
-  EXPECT_EQ(table.pFreeM, nullptr);
-  table.Put(keysM[2].c_str(), value);
-  EXPECT_EQ(poolM.GetUsedBytes(), 256u) << "one block of six nodes";
-  EXPECT_NE(table.pFreeM, nullptr);
-  for (int i = 3; i < 8; ++i) table.Put(keysM[i].c_str(), value);
-  EXPECT_EQ(poolM.GetUsedBytes(), 256u);
-  table.Put(keysM[8].c_str(), value);
-  EXPECT_EQ(poolM.GetUsedBytes(), 512u);
-  for (int i = 9; i < 100; ++i) {
+  std::vector<size_t> used;  // after 2 (the inline nodes), 3, 8 and 9 entries
+  for (int i = 0; i < 100; ++i) {
     table.Put(keysM[i].c_str(), value);
     *value = VekString(keysM[i].c_str());
+    if (i == 1 || i == 2 || i == 7 || i == 8) used.push_back(poolM.GetUsedBytes());
   }
+  EXPECT_EQ(used, std::vector<size_t>({0, 256, 256, 512})) << "blocks of six nodes";
   table.Clear();
-  EXPECT_EQ(table.nEntryM, 0);
-  EXPECT_EQ(table.nBucketM, 53);
-  EXPECT_EQ(table.sizeIndexM, 0);
-  EXPECT_EQ(table.pBucketsM, table.inlineBucketsM);
+  EXPECT_EQ(std::vector<int>({table.nEntryM, table.nBucketM, table.sizeIndexM, table.pBucketsM == table.inlineBucketsM}),
+            std::vector<int>({0, 53, 0, 1}));
   EXPECT_EQ(poolM.GetUsedBytes(), 0u) << "every block and bucket array went back";
   // The two inline nodes are free again, and the table works as new.
   int nFree = 0;

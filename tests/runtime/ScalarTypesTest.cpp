@@ -105,6 +105,9 @@ TEST_P(ScalarTypesTest, DatesTimesAndDateTimes) {
       {"2021-03-04 13:05:09", 1614863109000}, {"2021-03-04T13:05:09", 1614863109000}, {"2021-03-04", 0},
       {"2021-03-04t13:05:09", 0}, {"2021-03-04 13:05:09Z", 0}, {"1969-12-31 23:59:59", -1000}};
   for (const auto& [text, ms] : dateTimes) EXPECT_EQ(DateTime::Parse(Text(text)).millisecondsM, ms) << text;
+  EXPECT_TRUE(Date::Parse(Text("")) == Date::ZERO && Time::Parse(Text("24:00:00")) == Time::ZERO &&
+              DateTime::Parse(Text("2021-03-04")) == DateTime::ZERO && Date(1) != Date::ZERO && Time(1) != Time::ZERO &&
+              DateTime(1) != DateTime::ZERO);
 
   EXPECT_EQ(Str(Date(0).ToString()) + " " + Str(Date(-1).ToString()) + " " + Str(Date(18690).ToString()),
             "1970-01-01 1969-12-31 2021-03-04");

@@ -3,7 +3,9 @@
 #include <pthread.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <cstring>
 #include <cstdlib>
 
 namespace sarntest {
@@ -38,6 +40,16 @@ void RunOnStack(size_t bytes, const std::function<void()>& work) {
   ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
   pthread_join(thread, nullptr);
   pthread_attr_destroy(&attributes);
+}
+
+size_t TestSource::Read(void* buffer, size_t size) {
+  ++nReadM;
+  while (indexM < chunksM.size() && offsetM == chunksM[indexM].size()) ++indexM, offsetM = 0;
+  if (indexM == chunksM.size()) return 0;
+  size_t n = std::min(size, chunksM[indexM].size() - offsetM);
+  std::memcpy(buffer, chunksM[indexM].data() + offsetM, n);
+  offsetM += n;
+  return n;
 }
 
 std::string CorpusDir(const std::string& name) {

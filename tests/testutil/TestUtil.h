@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "vek/Vek.h"
+#include "wynbaselib/Bytestream.h"
 
 namespace sarntest {
 
@@ -40,6 +41,40 @@ class PoolTest : public ::testing::Test {
 // promise a whole read, write, compare and release fits in). Sanitizers and unoptimised builds
 // multiply frame sizes, so they get eight times the room; the promise is about release builds.
 void RunOnStack(size_t bytes, const std::function<void()>& work);
+
+// A byte source that hands out the given chunks, one per Read (a chunk larger than the request
+// goes in pieces), counts its reads, reports an error at its end when `isFailing`, and adds one
+// to `*pDeleted` when it is deleted.
+class TestSource : public wynbaselib::Bytesource {
+ public:
+  TestSource(const std::vector<std::string_view>& chunks, int* pDeleted = nullptr, bool isFailing = false)
+      : chunksM(chunks.begin(), chunks.end()), pDeletedM(pDeleted), isFailingM(isFailing) {}
+  ~TestSource() override {
+    if (pDeletedM != nullptr) ++*pDeletedM;
+  }
+  size_t Read(void* buffer, size_t size) override;
+  Bytesource* Duplicate() override { return nullptr; }
+  bool FError() const override { return isFailingM; }
+  const char* GetErrorText() const override { return isFailingM ? "truncated stream" : ""; }
+  int nReadM = 0;
+
+ private:
+  std::vector<std::string> chunksM;
+  size_t indexM = 0, offsetM = 0;
+  int* pDeletedM;
+  bool isFailingM;
+};
+
+// A sink that keeps what it is given; with `fFailM` set every write and flush fails.
+struct StringSink : wynbaselib::Bytesink {
+  bool Write(const char* data, size_t size) override {
+    textM.append(data, size);
+    return !fFailM;
+  }
+  bool Flush() override { return !fFailM; }
+  std::string textM;
+  bool fFailM = false;
+};
 
 // A folder of the shared public corpora, or "" when it is absent (tests then skip).
 std::string CorpusDir(const std::string& name);

@@ -22,12 +22,13 @@ using Out = ProtoBufByteOutputStream;
 struct ProtoBufFrameData {
   int64_t tagM;
   unsigned nSectionsM;
+  int64_t fieldTagM;  // the tag of the field being visited
 };
 
 constexpr int64_t kTagOfRecord = -1; // the tag follows from the field number and the wire type
 constexpr int64_t kNoTag = -2;       // the value alone
 
-ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, n}; }
+ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, n, kNoTag}; }
 
 // The tag and sections of a known dict: the type id (0 for no object) as a known-dict tag, then
 // the fields in a section.
@@ -41,15 +42,14 @@ void OpenKnownDictValue(const SarnObject* object, Out* out) {
 class ProtoBuf::Writer {
  public:
   using FrameData = ProtoBufFrameData;
-  using Walk = internal::ObjectWalk<Writer>;
+  using Walk = internal::ObjectWalk<Writer, internal::WalkVersions::CURRENT_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   Writer(const ProtoBuf& codec, Out* out)
       : codecM(codec),
         outM(out),
-        walkM(codec.pMempoolM, codec.structDefsM, static_cast<uint32_t>(codec.structDefCountM),
-              internal::WalkVersions::CURRENT_RECORDS) {}
+        walkM(codec.pMempoolM, codec.structDefsM, static_cast<uint32_t>(codec.structDefCountM)) {}
 
   // Walks `object` (fields of `info`) and closes the sections in `data` after it.
   void Run(const SarnObject* object, const StructInfo* info, const FrameData& data) {
@@ -57,12 +57,18 @@ class ProtoBuf::Writer {
   }
   void Run(const SarnObject* object, const FrameData& data) { Run(object, walkM.InfoOf(object), data); }
   void RunField(const FieldInfo& field, const SarnObject* object, int64_t tag) {
-    FrameData data{tag, 0};
+    FrameData data{tag, 0, kNoTag};
     if (!walkM.RunField(*this, object, field, nullptr, 0, data)) Fail();
   }
 
   void BeginObject(Frame&, Frame*) {}
-  void BeginField(Frame&) {}
+  void BeginField(Frame& frame) {
+    int64_t tag = frame.dataM.tagM;
+    if (tag == kTagOfRecord) {
+      tag = static_cast<int64_t>(frame.nFieldM) * 8 + TraitsOf(frame.pFieldM->dataType).wireType;
+    }
+    frame.dataM.fieldTagM = tag;
+  }
   void EndField(Frame&) {}
   void EndObject(Frame& frame) {
     for (unsigned k = 0; k < frame.dataM.nSectionsM; ++k) outM->EndSection();
@@ -75,8 +81,7 @@ class ProtoBuf::Writer {
     if (field.dataType == SARN_DATA_TYPE_BYTESTRING && FieldAccess::ReferenceAt(object, field, i) == nullptr) {
       return true;
     }
-    int64_t tag = frame.dataM.tagM;
-    if (tag == kTagOfRecord) tag = static_cast<int64_t>(frame.nFieldM) * 8 + TraitsOf(field.dataType).wireType;
+    int64_t tag = frame.dataM.fieldTagM;
     if (tag != kNoTag) GoogleInt::WriteGoogleU32(static_cast<unsigned int>(tag), outM);
     switch (field.dataType) {
       case SARN_DATA_TYPE_BOOL:

@@ -26,6 +26,18 @@ namespace {
 
 void AppendLiteral(ByteBuffer& out, const char* text) { AppendText(out, text, std::strlen(text)); }
 
+// The lead-in of one member (called directly rather than through the exported member).
+inline void WriteMemberName(const char* name, ByteBuffer& out, bool& fFirst) {
+  if (fFirst) {
+    fFirst = false;
+    out.AppendByte('"');
+  } else {
+    AppendText(out, ", \"", 3);
+  }
+  AppendLiteral(out, name);
+  AppendText(out, "\": ", 3);
+}
+
 // The anchor of the pseudo-field "type": the last field written at `version` whose name sorts
 // below "type", or -1.
 int FindTypeAnchor(const StructInfo* info, KernoVersion version) {
@@ -50,14 +62,14 @@ struct JsonFrameData {
 class JsonSarnObject::Writer {
  public:
   using FrameData = JsonFrameData;
-  using Walk = internal::ObjectWalk<Writer>;
+  using Walk = internal::ObjectWalk<Writer, internal::WalkVersions::CURRENT_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   Writer(JsonSarnObject& json, ByteBuffer& out)
       : jsonM(json),
         outM(out),
-        walkM(json.pMempoolM, json.pStructDefsM, json.nStructDefsM, internal::WalkVersions::CURRENT_RECORDS) {}
+        walkM(json.pMempoolM, json.pStructDefsM, json.nStructDefsM) {}
 
   Walk& GetWalk() { return walkM; }
 
@@ -75,7 +87,7 @@ class JsonSarnObject::Writer {
     if (!data.fTypeDoneM && data.anchorM >= 0 && frame.nFieldM >= static_cast<unsigned>(data.anchorM)) {
       WriteTypeMember(frame);
     }
-    jsonM.WriteFieldName(frame.pNameM, outM, data.fFirstM);
+    WriteMemberName(frame.pNameM, outM, data.fFirstM);
     if (frame.pFieldM->arity == SARN_ARITY_MULTI) {
       outM.AppendByte('[');
       data.fFirstElementM = true;
@@ -126,25 +138,25 @@ class JsonSarnObject::Writer {
  private:
   void WriteTypeMember(Frame& frame) {
     frame.dataM.fTypeDoneM = true;
-    jsonM.WriteFieldName("type", outM, frame.dataM.fFirstM);
+    WriteMemberName("type", outM, frame.dataM.fFirstM);
     outM.AppendByte('"');
     AppendLiteral(outM, frame.pInfoM->pName);
     outM.AppendByte('"');
   }
 
-  // False when the text could not be made (out of memory).
+  // False when a text could not be made (memory ran out): the value is not written empty.
   bool WriteText(const FieldInfo& field, const SarnObject* object, unsigned i) {
     internal::FieldText text;
     internal::FormatFieldText(jsonM.pMempoolM, jsonM.pStructDefsM, jsonM.nStructDefsM, field, object, i, text);
-    if (text.isOutOfMemoryM) return false;
+    if (text.isFailedM) return false;
     if (!TraitsOf(field.dataType).fQuotedInJson) {
       AppendText(outM, text.pBytesM, text.nLengthM);
-    } else if (internal::IsPlainText(text.pBytesM, text.nLengthM)) {
+    } else if (text.pStringM != nullptr) {
+      Json::StringToJson(*text.pStringM, false, outM);
+    } else if (text.isPlainM || internal::IsPlainText(text.pBytesM, text.nLengthM)) {
       outM.AppendByte('"');
       AppendText(outM, text.pBytesM, text.nLengthM);
       outM.AppendByte('"');
-    } else if (text.pStringM != nullptr) {
-      Json::StringToJson(*text.pStringM, false, outM);
     } else {
       VekString copy = VekString::FromUtf8Bytes(jsonM.pMempoolM, text.nLengthM, text.pBytesM);
       if (copy.FEmpty() && text.nLengthM != 0) return false;
@@ -180,14 +192,7 @@ bool JsonSarnObject::SarnObjectToJson(const SarnObject* object, KernoVersion ver
 }
 
 void JsonSarnObject::WriteFieldName(const char* name, ByteBuffer& out, bool& fFirst) {
-  if (fFirst) {
-    fFirst = false;
-    out.AppendByte('"');
-  } else {
-    AppendText(out, ", \"", 3);
-  }
-  AppendLiteral(out, name);
-  AppendText(out, "\": ", 3);
+  WriteMemberName(name, out, fFirst);
 }
 
 void JsonSarnObject::LazyToJson(const LazyDict* lazy, ByteBuffer& out) { lazy->ToJsonByteBuffer(out, false); }

@@ -9,8 +9,8 @@
 // scalar travels as a quoted string. A null element of a reference array is left out.
 //
 // Writing does not recurse on the depth of the object tree: nested objects (also objects held by
-// lazy payloads) are walked with an explicit stack, so any depth is written; the only failure is
-// a lack of memory (the walk's stack, a value's text or the output buffer).
+// lazy payloads) are walked with an explicit stack, so any depth is written; it fails only when
+// memory runs out.
 //
 // Ownership and pools: the converter owns nothing but its scratch array; the strings it makes live
 // in pMempoolM and are released before a call returns; the caller owns the output buffer.
@@ -41,7 +41,7 @@ class SARN_EXPORT JsonSarnObject {
   JsonSarnObject& operator=(const JsonSarnObject&) = delete;
 
   // Appends the JSON text of `object` (and everything it holds) to `out`. False only when memory
-  // runs out; `out` is then failed (ByteBuffer::HasFailed), never left with a piece missing.
+  // runs out; `out` is then failed (ByteBuffer::HasFailed) rather than left with a piece missing.
   bool SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out);
   // The same text as a new string in pMempoolM; empty when memory runs out.
   VekString SarnObjectToJson(const SarnObject* object, KernoVersion version);

@@ -60,6 +60,7 @@ constexpr DataTypeTraits::Storage kScalar = DataTypeTraits::STORAGE_SCALAR;
 constexpr DataTypeTraits::Storage kString = DataTypeTraits::STORAGE_STRING;
 constexpr DataTypeTraits::Storage kReference = DataTypeTraits::STORAGE_REFERENCE;
 
+// Columns: code, storage, width, holds objects, has text, quoted in JSON, wire type.
 inline constexpr DataTypeTraits kDataTypeTraitsG[] = {
     {SARN_DATA_TYPE_BOOL, kScalar, 1, false, true, false, 0},
     {SARN_DATA_TYPE_BYTESTRING, kReference, 0, false, true, true, 2},
@@ -85,13 +86,14 @@ inline constexpr DataTypeTraits kDataTypeTraitsG[] = {
 };
 inline constexpr unsigned kDataTypeCountG = sizeof kDataTypeTraitsG / sizeof kDataTypeTraitsG[0];
 // Codes 21..31 (the placeholder's and unused ones): nothing to read, skipped by every walker.
-inline constexpr DataTypeTraits kNoDataTypeG = {SARN_DATA_TYPE_PLACEHOLDER, DataTypeTraits::STORAGE_NONE, 0, false, false, false, 0};
+inline constexpr DataTypeTraits kNoDataTypeG = {SARN_DATA_TYPE_PLACEHOLDER, DataTypeTraits::STORAGE_NONE, 0,
+                                                false, false, false, 0};
 
 constexpr bool TraitsAreConsistent() {
   for (unsigned code = 0; code < kDataTypeCountG; ++code) {
     const DataTypeTraits& t = kDataTypeTraitsG[code];
-    if (t.dataType != code) return false;                                   // one row per code, in order
-    if ((t.storage == kScalar) != (t.width != 0)) return false;   // only scalars have a width
+    if (t.dataType != code) return false;                          // one row per code, in order
+    if ((t.storage == kScalar) != (t.width != 0)) return false;    // only scalars have a width
     if (t.width != 0 && t.width != 1 && t.width != 4 && t.width != 8) return false;
     if (t.fHoldsObjects && (t.storage != kReference || t.fHasText)) return false;
     if (!t.fHasText && t.fQuotedInJson) return false;

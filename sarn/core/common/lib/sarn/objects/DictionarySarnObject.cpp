@@ -61,34 +61,33 @@ struct DictionaryFrameData {
 class DictionarySarnObject::Builder {
  public:
   using FrameData = DictionaryFrameData;
-  using Walk = internal::ObjectWalk<Builder>;
+  using Walk = internal::ObjectWalk<Builder, internal::WalkVersions::OLDER_RECORDS>;
   using Frame = Walk::Frame;
   using Child = Walk::Child;
 
   explicit Builder(DictionarySarnObject& converter)
       : converterM(converter),
-        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM),
-              internal::WalkVersions::OLDER_RECORDS) {}
+        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM)) {}
 
   Walk& GetWalk() { return walkM; }
   ref<Dictionary>& Result() { return resultM; }
 
-  // True when an allocation failed: the tree is then incomplete and no result.
-  bool IsOutOfMemory() const { return isOutOfMemoryM; }
+  // Memory that runs out anywhere fails the whole conversion (a null result, never a tree with a
+  // value missing): the hooks that cannot stop the walk note it, and the next value stops it.
+  bool WasOutOfMemory() const { return wasOutOfMemoryM; }
 
-  // BeginObject and BeginField cannot stop the walk: a failure there is recorded, and the next
-  // Value stops it (before anything touches the dictionary or array that was not made).
   void BeginObject(Frame& frame, Frame* parent) {
     VekMempool* pool = converterM.pMempoolM;
     ref<Dictionary> dictionary =
         Dictionary::New(pool, frame.pInfoM != nullptr ? CachedName(pool, frame.pInfoM->pName) : VekString());
     frame.dataM.pDictionaryM = dictionary.Get();
     if (!dictionary) {
-      isOutOfMemoryM = true;
+      wasOutOfMemoryM = true;
     } else if (parent == nullptr) {
       resultM = dictionary;
     } else if (!Put(*parent, dictionary)) {
-      isOutOfMemoryM = true;
+      // The parent did not take it, so it is gone when `dictionary` goes: nothing may fill it.
+      frame.dataM.pDictionaryM = nullptr;
     }
   }
 
@@ -96,45 +95,54 @@ class DictionarySarnObject::Builder {
     VekMempool* pool = converterM.pMempoolM;
     if (frame.pNameM != nullptr) frame.dataM.pKeyM = &CachedName(pool, frame.pNameM);
     frame.dataM.pArrayM = nullptr;
-    if (frame.pFieldM->arity == SARN_ARITY_MULTI && !isOutOfMemoryM) {
+    if (frame.pFieldM->arity == SARN_ARITY_MULTI && !wasOutOfMemoryM) {
       // The walk reports only fields with a value to add, so the array is never left empty.
       ref<ArrayValue> array = new (pool) ArrayValue();
-      if (frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, array)) {
-        frame.dataM.pArrayM = array.Get();
-      } else {
-        isOutOfMemoryM = true;
+      if (!array || !frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, array)) {
+        wasOutOfMemoryM = true;
+        return;
       }
+      frame.dataM.pArrayM = array.Get();
     }
   }
 
   bool Value(Frame& frame, unsigned i, Child& child) {
-    if (isOutOfMemoryM) return false;
+    if (wasOutOfMemoryM) return false;
     const FieldInfo& field = *frame.pFieldM;
-    if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
+    // A lazy payload is kept as it is (shared, not converted); other objects become dictionaries.
+    if (TraitsOf(field.dataType).fHoldsObjects && field.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
       child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
       child.versionM = frame.versionM;
       return true;
     }
-    // The walk passes over the values that have nothing to add, so a null one was not made.
     ref<DictValue> value = converterM.MakeValue(field, frame.pObjectM, i);
-    isOutOfMemoryM = !value || !Put(frame, value);
-    return !isOutOfMemoryM;
+    if (value == nullptr) {
+      // The walk passes over null references; of the rest only a free-form dictionary without a
+      // tree has nothing to add. Any other null is memory that ran out.
+      if (field.dataType == SARN_DATA_TYPE_ANY_DICT) return true;
+      wasOutOfMemoryM = true;
+      return false;
+    }
+    return Put(frame, value);
   }
 
   void EndField(Frame&) {}
   void EndObject(Frame&) {}
 
  private:
-  // Adds `value` for the field `frame` is visiting: to its array, or under its key.
-  static bool Put(Frame& frame, const ref<DictValue>& value) {
-    if (frame.dataM.pArrayM != nullptr) return frame.dataM.pArrayM->Add(value);
-    return frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, value);
+  // Adds `value` for the field `frame` is visiting: to its array, or under its key; false (and
+  // noted) when memory ran out.
+  bool Put(Frame& frame, const ref<DictValue>& value) {
+    bool isAdded = frame.dataM.pArrayM != nullptr ? frame.dataM.pArrayM->Add(value)
+                                                   : frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, value);
+    if (!isAdded) wasOutOfMemoryM = true;
+    return isAdded;
   }
 
   DictionarySarnObject& converterM;
   Walk walkM;
   ref<Dictionary> resultM;
-  bool isOutOfMemoryM = false;
+  bool wasOutOfMemoryM = false;
 };
 
 DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* const* structDefs, int count)
@@ -144,9 +152,8 @@ DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* c
 
 ref<Dictionary> DictionarySarnObject::SarnObjectToDictionary(const SarnObject* object, KernoVersion version) {
   Builder builder(*this);
-  if (!builder.GetWalk().Run(builder, object, version, DictionaryFrameData()) || builder.IsOutOfMemory()) {
-    return ref<Dictionary>();
-  }
+  bool isWalked = builder.GetWalk().Run(builder, object, version, DictionaryFrameData());
+  if (!isWalked || builder.WasOutOfMemory()) return ref<Dictionary>();
   return builder.Result();
 }
 
@@ -172,7 +179,7 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
   if (traits.fHasText) {
     internal::FieldText text;
     internal::FormatFieldText(pool, structDefsM, static_cast<uint32_t>(structDefCountM), field, object, i, text);
-    if (text.isOutOfMemoryM) return nullptr;
+    if (text.isFailedM) return nullptr;
     ref<StringValue> value;
     if (text.pStringM != nullptr) {
       value = new (pool) StringValue(*text.pStringM);
@@ -181,9 +188,10 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
     } else {
       VekString copy = VekString::FromUtf8Bytes(pool, text.nLengthM, text.pBytesM);
       if (copy.FEmpty() && text.nLengthM != 0) return nullptr;
-      value = new (pool) StringValue(static_cast<VekString&&>(copy));
+      value = new (pool) StringValue(copy);
     }
-    if (value) value->needQuotesM = traits.fQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
+    if (value == nullptr) return nullptr;
+    value->needQuotesM = traits.fQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
     return value;
   }
   VekCore* reference = FieldAccess::ReferenceAt(object, field, i);

@@ -5,10 +5,9 @@
 // present field under its name; scalars become StringValues (BOOL, S32, U32 and FLOAT bare, the
 // rest quoted), nested objects nested dictionaries, multi-valued fields ArrayValues (empty ones
 // and null references are left out); free-form dictionaries and lazy payloads are shared, not
-// copied. Nested objects are walked with an explicit stack, so any depth is converted; the only
-// failure of this direction is a lack of memory (a null result, never a tree with a value
-// missing). Dictionary to object says "Out of memory." then, with the words of the levels
-// around it.
+// copied. This direction fails only when memory runs out (the result is then null, never a tree
+// with a value missing), and it walks nested objects with an explicit stack, so any depth is
+// converted.
 //
 // Dictionary to object: the first "type" value names the type; each field of the type is read
 // from the first value under its name; names that are not fields are ignored. Failures return

@@ -30,17 +30,23 @@ void Set(FieldText& text, const char* bytes, size_t length) {
   text.nLengthM = length;
 }
 
+// Texts made of digits, signs, dashes, colons and letters of our own.
+void SetPlain(FieldText& text, const char* bytes, size_t length) {
+  Set(text, bytes, length);
+  text.isPlainM = true;
+}
+
 void SetString(FieldText& text, const VekString& string) {
   text.pStringM = &string;
   Set(text, string.Utf8(), string.NByte());
 }
 
-// Made texts are never empty but for an empty byte string's (`isEmptyAllowed`): any other
-// empty one could not be made.
+// Only a byte string's text may be empty (`isEmptyAllowed`); any other made text is empty only when
+// it could not be had.
 void SetMade(FieldText& text, VekString&& string, bool isEmptyAllowed = false) {
-  text.madeM = static_cast<VekString&&>(string);
-  text.isOutOfMemoryM = text.madeM.FEmpty() && !isEmptyAllowed;
-  SetString(text, text.madeM);
+  if (string.FEmpty() && !isEmptyAllowed) text.isFailedM = true;
+  text.madeM.emplace(static_cast<VekString&&>(string));
+  SetString(text, *text.madeM);
 }
 
 // Appends up to the room left (one byte is kept for the NUL).
@@ -81,16 +87,16 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
   switch (field.dataType) {
     case SARN_DATA_TYPE_BOOL:
       if (FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0) {
-        Set(text, "true", 4);
+        SetPlain(text, "true", 4);
       } else {
-        Set(text, "false", 5);
+        SetPlain(text, "false", 5);
       }
       return;
     case SARN_DATA_TYPE_BYTESTRING: {
       // A missing byte string reads as an empty one.
       ref<vek::ByteBuffer> bytes = static_cast<vek::ByteBuffer*>(FieldAccess::ReferenceAt(object, field, i));
       if (bytes == nullptr) {
-        Set(text, "", 0);
+        SetPlain(text, "", 0);
       } else {
         SetMade(text, Dict::FormatBytestring(pool, bytes), bytes->GetLength() == 0);
       }
@@ -105,7 +111,7 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
     case SARN_DATA_TYPE_DATE: {
       Date date = FieldAccess::ScalarValue<Date>(object, field, i);
       if (FormatDateText(date.daysM, room)) {
-        Set(text, room, 10);
+        SetPlain(text, room, 10);
       } else {
         SetMade(text, date.ToString());
       }
@@ -115,7 +121,7 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
       // Milliseconds are dropped by truncation, as a division of the signed count does.
       DateTime dateTime = FieldAccess::ScalarValue<DateTime>(object, field, i);
       if (FormatDateTimeText(dateTime.millisecondsM / 1000, room)) {
-        Set(text, room, 19);
+        SetPlain(text, room, 19);
       } else {
         SetMade(text, dateTime.ToString());
       }
@@ -124,7 +130,7 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
     case SARN_DATA_TYPE_TIME: {
       int64_t seconds = FieldAccess::ScalarValue<Time>(object, field, i).millisecondsM / 1000;
       FormatTimeOfDayText(seconds - FloorDiv(seconds, 86400) * 86400, room);
-      Set(text, room, 8);
+      SetPlain(text, room, 8);
       return;
     }
     case SARN_DATA_TYPE_ENUM: {
@@ -134,7 +140,7 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
         Set(text, name, std::strlen(name));
         text.isNameM = true;
       } else {
-        Set(text, room, static_cast<size_t>(std::snprintf(room, kIdTextRoom, "INVALID_VALUE:%u", value)));
+        SetPlain(text, room, static_cast<size_t>(std::snprintf(room, kIdTextRoom, "INVALID_VALUE:%u", value)));
       }
       return;
     }
@@ -147,16 +153,16 @@ void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint
       Set(text, room, FormatIdText(structDefs, nStructDefs, field, object, i, text.roomM));
       return;
     case SARN_DATA_TYPE_S64:
-      Set(text, room, FormatS64Into(room, FieldAccess::ScalarValue<int64_t>(object, field, i)));
+      SetPlain(text, room, FormatS64Into(room, FieldAccess::ScalarValue<int64_t>(object, field, i)));
       return;
     case SARN_DATA_TYPE_S32:
-      Set(text, room, FormatS64Into(room, FieldAccess::ScalarValue<int32_t>(object, field, i)));
+      SetPlain(text, room, FormatS64Into(room, FieldAccess::ScalarValue<int32_t>(object, field, i)));
       return;
     case SARN_DATA_TYPE_U32:
-      Set(text, room, FormatU64Into(room, FieldAccess::ScalarValue<uint32_t>(object, field, i)));
+      SetPlain(text, room, FormatU64Into(room, FieldAccess::ScalarValue<uint32_t>(object, field, i)));
       return;
     case SARN_DATA_TYPE_U64:
-      Set(text, room, FormatU64Into(room, FieldAccess::ScalarValue<uint64_t>(object, field, i)));
+      SetPlain(text, room, FormatU64Into(room, FieldAccess::ScalarValue<uint64_t>(object, field, i)));
       return;
     case SARN_DATA_TYPE_STRING:
       SetString(text, FieldAccess::StringAt(object, field, i));

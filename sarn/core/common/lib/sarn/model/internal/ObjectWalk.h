@@ -11,7 +11,7 @@
 // objects, lazy payloads: DataTypeTraits::IsNullAbsent). A field with nothing left to visit is not
 // reported at all, so a writer never has to take back a name it wrote.
 //
-// The visitor (a class given as the template argument, called without virtual dispatch):
+// The visitor (the first template argument, called without virtual dispatch):
 //   using FrameData = ...;                    trivially copyable state kept per object frame
 //   void BeginObject(Frame& frame, Frame* parent);   parent: null for the walk's first object
 //   void BeginField(Frame& frame);            frame.pFieldM, pNameM, nFieldM, nElementM are set
@@ -24,9 +24,9 @@
 // A descended object is walked completely (BeginObject to EndObject) before the next value of
 // the parent's field.
 //
-// Version policy: CURRENT_RECORDS takes each field's current record, filtered by the version
-// (0: every record whose arity is not NONE); OLDER_RECORDS lets an older record whose range holds
-// the version replace the current one (FieldForVersion).
+// Version policy (the second template argument): CURRENT_RECORDS takes each field's current
+// record, filtered by the version (0: every record whose arity is not NONE); OLDER_RECORDS lets an
+// older record whose range holds the version replace the current one (FieldForVersion).
 //
 // Failure: when the stack cannot grow (the pool is out of memory) or the visitor returns false,
 // Run returns false at once; no assert, no exception. References the walk holds are released.
@@ -73,7 +73,7 @@ struct WalkChild {
   Data dataM{};                          // the new frame's initial state
 };
 
-template <class Visitor>
+template <class Visitor, WalkVersions kVersions>
 class ObjectWalk {
  public:
   using Data = typename Visitor::FrameData;
@@ -81,8 +81,8 @@ class ObjectWalk {
   using Child = WalkChild<Data>;
   static_assert(std::is_trivially_copyable<Data>::value, "frame data is copied as bytes");
 
-  ObjectWalk(VekMempool* pool, const StructInfo* const* structDefs, uint32_t nStructDefs, WalkVersions versions)
-      : stackM(pool), pStructDefsM(structDefs), nStructDefsM(nStructDefs), versionsM(versions) {}
+  ObjectWalk(VekMempool* pool, const StructInfo* const* structDefs, uint32_t nStructDefs)
+      : stackM(pool), pStructDefsM(structDefs), nStructDefsM(nStructDefs) {}
 
   // The StructInfo of `object`'s type in the walk's table, or null (also for a null object).
   const StructInfo* InfoOf(const SarnObject* object) const {
@@ -137,9 +137,12 @@ class ObjectWalk {
   }
 
   const FieldInfo* Select(const StructInfo* info, unsigned n, KernoVersion version) const {
-    if (versionsM == WalkVersions::OLDER_RECORDS) return FieldForVersion(info, n, version);
-    const FieldInfo& field = info->vFieldInfo[n];
-    return FieldTakesPart(field, version) ? &field : nullptr;
+    if constexpr (kVersions == WalkVersions::OLDER_RECORDS) {
+      return FieldForVersion(info, n, version);
+    } else {
+      const FieldInfo& field = info->vFieldInfo[n];
+      return FieldTakesPart(field, version) ? &field : nullptr;
+    }
   }
 
   static void StartField(Visitor& visitor, Frame& frame, const FieldInfo* field, unsigned n, const char* name,
@@ -160,7 +163,8 @@ class ObjectWalk {
     while (frame.nextFieldM < info->nFieldInfo) {
       unsigned n = frame.nextFieldM++;
       const FieldInfo* field = Select(info, n, frame.versionM);
-      if (field == nullptr || FieldAccess::StorageOf(field->dataType) == FieldAccess::STORAGE_NONE) continue;
+      // Codes past the traits table have no values.
+      if (field == nullptr || field->dataType >= kDataTypeCountG) continue;
       unsigned count = 1;
       if (field->arity == SARN_ARITY_MULTI) {
         count = FieldAccess::Count(frame.pObjectM, *field);
@@ -175,30 +179,45 @@ class ObjectWalk {
     return false;
   }
 
+  enum Step { STEP_DESCEND, STEP_DONE, STEP_FAILED };
+
+  // Visits the values of `frame`, field after field, until one is a schema object to descend
+  // into (then in `child`), the frame has nothing left, or the visitor stops. Values that are not
+  // objects never leave this loop, so they cost no trip through the stack.
+  Step Advance(Visitor& visitor, Frame& frame, Child& child) {
+    for (;;) {
+      if (frame.pFieldM == nullptr && (frame.isOneFieldM || !NextField(visitor, frame))) return STEP_DONE;
+      const FieldInfo& field = *frame.pFieldM;
+      const bool isNullAbsent = TraitsOf(field.dataType).IsNullAbsent();
+      for (unsigned i = frame.nextElementM; i < frame.nElementM; ++i) {
+        if (isNullAbsent && FieldAccess::ReferenceAt(frame.pObjectM, field, i) == nullptr) continue;
+        if (!visitor.Value(frame, i, child)) return STEP_FAILED;
+        if (child.pObjectM != nullptr) {
+          frame.nextElementM = i + 1;
+          return STEP_DESCEND;
+        }
+      }
+      visitor.EndField(frame);
+      frame.pFieldM = nullptr;
+    }
+  }
+
   bool Walk(Visitor& visitor) {
     while (!stackM.Empty()) {
       Frame& frame = stackM.Top();
-      if (frame.pFieldM == nullptr && !NextField(visitor, frame)) {
-        visitor.EndObject(frame);
-        Release(frame);
+      Child child;
+      Step step = Advance(visitor, frame, child);
+      if (step == STEP_FAILED) return Fail(child);
+      if (step == STEP_DONE) {
+        if (frame.isOneFieldM) {
+          *pOneFieldDataM = frame.dataM;
+        } else {
+          visitor.EndObject(frame);
+          Release(frame);
+        }
         stackM.Pop();
         continue;
       }
-      const FieldInfo& field = *frame.pFieldM;
-      unsigned i = FirstValue(frame.pObjectM, field, frame.nextElementM, frame.nElementM);
-      if (i == frame.nElementM) {
-        visitor.EndField(frame);
-        frame.pFieldM = nullptr;
-        if (frame.isOneFieldM) {
-          *pOneFieldDataM = frame.dataM;
-          stackM.Pop();
-        }
-        continue;
-      }
-      frame.nextElementM = i + 1;
-      Child child;
-      if (!visitor.Value(frame, i, child)) return Fail(child);
-      if (child.pObjectM == nullptr) continue;
       Frame* next = stackM.Push();
       if (next == nullptr) return Fail(child);
       next->pObjectM = child.pObjectM;
@@ -227,7 +246,6 @@ class ObjectWalk {
   WalkStack<Frame> stackM;
   const StructInfo* const* pStructDefsM;
   uint32_t nStructDefsM;
-  WalkVersions versionsM;
   Data* pOneFieldDataM = nullptr;
 };
 

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
 #include "sarn/model/Schema.h"
 #include "vek/VekMempool.h"
@@ -21,7 +22,7 @@ constexpr size_t kIdTextRoom = 100;
 // One value's text. The bytes are pBytesM[0, nLengthM); where they are those of a string (the
 // field's own, or one the formatter had to make), pStringM points at it, so a writer can share
 // it instead of copying. isNameM says that the bytes are a constant name of the metadata (an enum
-// item), which outlives every writer.
+// item), which outlives every writer; isPlainM that they hold nothing a JSON string escapes.
 struct FieldText {
   FieldText() = default;
   FieldText(const FieldText&) = delete;
@@ -31,9 +32,11 @@ struct FieldText {
   size_t nLengthM = 0;
   const VekString* pStringM = nullptr;
   bool isNameM = false;
-  // The text had to be made and could not be (out of memory): there is no text.
-  bool isOutOfMemoryM = false;
-  VekString madeM;
+  bool isPlainM = false;           // known to need no JSON escaping (digits, dates, times, literals)
+  // A text the formatter had to make could not be had (memory ran out); the bytes are then empty
+  // and must not be written as the value.
+  bool isFailedM = false;
+  std::optional<VekString> madeM;  // engaged only when a string had to be made
   char roomM[kIdTextRoom];
 };
 
@@ -42,7 +45,8 @@ struct FieldText {
 // Dict::FormatFloat), byte strings in Base64 (a null one empty), the scalar types' ToString forms,
 // enum item names ("INVALID_VALUE:%u" without one), and id texts: the prefix of the type the
 // field refers to (looked up in `structDefs`), then the number (as a long id) or the string, cut
-// to 99 bytes; "XXX" when the field refers to no type. Strings are their own text.
+// to 99 bytes; "XXX" when the field refers to no type. Strings are their own text. When memory
+// runs out for a text that had to be made, text.isFailedM is set.
 void FormatFieldText(VekMempool* pool, const StructInfo* const* structDefs, uint32_t nStructDefs,
                      const FieldInfo& field, const SarnObject* object, unsigned i, FieldText& text);
 
