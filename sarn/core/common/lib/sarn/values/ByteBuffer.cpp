@@ -5,18 +5,22 @@
 namespace sarn {
 
 Vek1ByteBuffer::Vek1ByteBuffer(VekMempool* pool)
-    : bytesM(new (pool) VekByteString()), nUsedM(0), pMempoolM(pool), isFailedM(false) {}
+    : bytesM(new (pool) VekByteString()), nUsedM(0), pDataM(nullptr), capacityM(0), pMempoolM(pool), isFailedM(false) {}
 
 Vek1ByteBuffer::~Vek1ByteBuffer() {}
 
 bool Vek1ByteBuffer::Grow(unsigned long n) {
   if (isFailedM) return false;
-  unsigned long capacity = Capacity();
+  unsigned long capacity = capacityM;
   unsigned long extra = capacity / 5 > 256 ? capacity / 5 : 256;
   // The sum must not wrap: a wrapped capacity would be smaller than what is appended.
   if (n > ULONG_MAX - capacity - extra) return false;
   if (!bytesM) bytesM = new (pMempoolM) VekByteString();
-  if (bytesM && bytesM->SetLength(capacity + n + extra)) return true;
+  if (bytesM && bytesM->SetLength(capacity + n + extra)) {
+    pDataM = bytesM->GetData();
+    capacityM = bytesM->GetLength();
+    return true;
+  }
   Fail();
   return false;
 }
@@ -25,6 +29,8 @@ void Vek1ByteBuffer::Fail() {
   // Keeping the bytes would let a later, smaller append succeed behind the missing piece.
   isFailedM = true;
   bytesM = nullptr;
+  pDataM = nullptr;
+  capacityM = 0;
   nUsedM = 0;
 }
 

@@ -41,8 +41,8 @@ class SARN_EXPORT Vek1ByteBuffer {
   // Each append returns false, appending nothing, when the storage cannot grow (a total length
   // the platform cannot hold); when memory runs out it also fails the buffer (see above).
   bool AppendByte(unsigned char byte) {
-    if (1 >= Capacity() - nUsedM && !Grow(1)) return false;
-    bytesM->GetData()[nUsedM++] = byte;
+    if (1 >= capacityM - nUsedM && !Grow(1)) return false;
+    pDataM[nUsedM++] = byte;
     return true;
   }
   bool AppendBytes(const unsigned char* data, unsigned long length) {
@@ -50,8 +50,8 @@ class SARN_EXPORT Vek1ByteBuffer {
     if (length > static_cast<unsigned long>(PTRDIFF_MAX)) return false;
     // Written as a difference so that a huge `length` cannot wrap the test (the capacity is
     // never below nUsedM).
-    if (length >= Capacity() - nUsedM && !Grow(length)) return false;
-    std::memcpy(bytesM->GetData() + nUsedM, data, length);
+    if (length >= capacityM - nUsedM && !Grow(length)) return false;
+    std::memcpy(pDataM + nUsedM, data, length);
     nUsedM += length;
     return true;
   }
@@ -59,10 +59,10 @@ class SARN_EXPORT Vek1ByteBuffer {
   // that a writer that knows its output size grows once instead of step by step.
   bool Reserve(unsigned long length) {
     if (length > static_cast<unsigned long>(PTRDIFF_MAX)) return false;
-    return length < Capacity() - nUsedM || Grow(length);
+    return length < capacityM - nUsedM || Grow(length);
   }
   // Null while nothing was ever appended, and after a failure.
-  const unsigned char* GetData() const { return bytesM ? bytesM->GetData() : nullptr; }
+  const unsigned char* GetData() const { return pDataM; }
   unsigned long GetLength() const { return static_cast<unsigned long>(nUsedM); }
   // True once an append ran out of memory; the buffer is then empty for good.
   bool HasFailed() const { return isFailedM; }
@@ -74,9 +74,12 @@ class SARN_EXPORT Vek1ByteBuffer {
   uint64_t nUsedM;            // bytes appended: the first nUsedM bytes of bytesM
 
  private:
-  unsigned long Capacity() const { return bytesM ? bytesM->GetLength() : 0; }
   // Sets the capacity to c + n + max(c / 5, 256) for the current capacity c.
   bool Grow(unsigned long n);
+  // bytesM's data and length as of the last Grow, so that an append reads no other object
+  // (and needs no test for a byte string that could not be made: both are then 0).
+  unsigned char* pDataM;
+  unsigned long capacityM;
   VekMempool* pMempoolM;  // where bytesM is made again when it could not be made at first
   bool isFailedM;
 };
