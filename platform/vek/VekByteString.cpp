@@ -57,7 +57,7 @@ ref<ByteBuffer> ByteBuffer::New(VekMempool* pool) { return ref<ByteBuffer>(new (
 
 ref<ByteBuffer> ByteBuffer::New(VekMempool* pool, const void* data, size_t length) {
   ref<ByteBuffer> buffer = New(pool);
-  if (length != 0 && !buffer->Append(data, length)) return ref<ByteBuffer>();
+  if (!buffer || (length != 0 && !buffer->Append(data, length))) return ref<ByteBuffer>();
   return buffer;
 }
 

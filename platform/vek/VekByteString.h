@@ -63,6 +63,7 @@ class ByteBuffer : public VekCore {
   explicit ByteBuffer(VekMempool* pool);
   ~ByteBuffer() override;
 
+  // Null when memory runs out.
   static ref<ByteBuffer> New(VekMempool* pool);
   static ref<ByteBuffer> New(VekMempool* pool, const void* data, size_t length);
 

@@ -49,10 +49,11 @@ VekCore::VekCore() : pMempoolM(nullptr), refCountM(0) {
 
 VekCore::~VekCore() {}
 
-void* VekCore::operator new(size_t size, VekMempool* pool) {
+void* VekCore::operator new(size_t size, VekMempool* pool) noexcept {
   if (pool == nullptr) pool = VekMempool::Default();
   void* p = pool->Malloc(size);
-  if (p == nullptr) throw std::bad_alloc();
+  // Nothing is pending for a failed allocation: no constructor will run for it.
+  if (p == nullptr) return nullptr;
   PushPending(p, pool);
   return p;
 }
@@ -64,7 +65,7 @@ void VekCore::operator delete(void* p) {
   pool->Free(p);
 }
 
-void VekCore::operator delete(void* p, VekMempool* pool) {
+void VekCore::operator delete(void* p, VekMempool* pool) noexcept {
   if (p == nullptr) return;
   TakePending(p);
   (pool != nullptr ? pool : VekMempool::Default())->Free(p);

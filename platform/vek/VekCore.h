@@ -3,6 +3,8 @@
 // Objects are made in a pool with the counted new and start with a count of 0; the first
 // ref<T> takes the first reference:
 //     ref<Thing> p = new (pool) Thing(args...);
+// The counted new never throws: when the pool cannot supply the bytes the new-expression is null
+// (no constructor runs, no argument is leaked by the object), so every caller checks the result.
 // The last DownRef() runs the virtual destructor and returns the memory to the object's pool.
 // Counts change atomically, so references may be taken and dropped on several threads; the
 // object itself is not locked.
@@ -26,11 +28,12 @@ class VekCore {
   VekCore(const VekCore&) = delete;
   VekCore& operator=(const VekCore&) = delete;
 
-  // The counted new: the object remembers `pool` and is freed back to it.
-  static void* operator new(size_t size, VekMempool* pool);
+  // The counted new: the object remembers `pool` and is freed back to it. Null when memory
+  // runs out; being noexcept, the new-expression then skips the constructor and is null too.
+  static void* operator new(size_t size, VekMempool* pool) noexcept;
   static void operator delete(void* p);
   // Called only when a constructor throws after the counted new.
-  static void operator delete(void* p, VekMempool* pool);
+  static void operator delete(void* p, VekMempool* pool) noexcept;
 
   VekMempool* GetMempool() const { return pMempoolM; }
   void UpRef() const { refCountM.fetch_add(1, std::memory_order_relaxed); }
@@ -160,9 +163,9 @@ class nonRef {
 static_assert(sizeof(ref<VekCore>) == sizeof(void*), "ref<T> is one pointer");
 static_assert(sizeof(nonRef<VekCore>) == sizeof(void*), "nonRef<T> is one pointer");
 
-// Allocates a T in `pool` from one constructor argument. The argument is taken by constant
-// reference so that the explicit form MempoolNew<Dict, ref<Dictionary>>(pool, dictionary)
-// accepts a named argument.
+// Allocates a T in `pool` from one constructor argument; null when memory runs out. The argument
+// is taken by constant reference so that the explicit form MempoolNew<Dict, ref<Dictionary>>(pool,
+// dictionary) accepts a named argument.
 template <class T, class A>
 ref<T> MempoolNew(VekMempool* pool, const A& arg) {
   return ref<T>(new (pool) T(arg));

@@ -36,7 +36,10 @@ class Bytesink {
 };
 
 // A byte stream in memory, readable and writable. Copies (and duplicates) share one content:
-// what any of them writes is appended to it; each copy reads from its own position.
+// what any of them writes is appended to it; each copy reads from its own position. The content
+// lives on the C++ heap; when it cannot grow, Write returns false (nothing is thrown), and a
+// stream whose content could not be made at all reads as empty and refuses every write.
+// Duplicate returns null when memory runs out.
 class InMemoryBytestream : public Bytesource, public Bytesink {
  public:
   InMemoryBytestream();
@@ -50,7 +53,7 @@ class InMemoryBytestream : public Bytesource, public Bytesink {
   bool Write(const char* data, size_t size) override;
   bool Flush() override { return true; }
 
-  const std::string& GetContent() const { return *pContentM; }
+  const std::string& GetContent() const;
   size_t GetPosition() const { return positionM; }
   // Moves the read position (clamped to the content's size).
   void Seek(size_t position);

@@ -3,6 +3,7 @@
 #include <zlib.h>
 
 #include <cstring>
+#include <new>
 
 namespace wynbaselib {
 
@@ -10,6 +11,7 @@ namespace {
 
 constexpr size_t kChunk = 16384;
 constexpr int kGzipWindowBits = 15 + 16;  // +16: gzip header and trailer instead of zlib's
+const char kOutOfMemoryText[] = "out of memory in gzip decoder";
 
 voidpf PoolAlloc(voidpf opaque, uInt items, uInt size) {
   return static_cast<VekMempool*>(opaque)->Calloc(items, size);
@@ -79,18 +81,23 @@ struct GzipBytesink::State {
   }
 };
 
-GzipBytesink::GzipBytesink(Bytesink* next, VekMempool* pool, int level) : pStateM(new State) {
+// The state comes from the C++ heap without an exception: a sink (or source) whose state could
+// not be made is failed from the start.
+GzipBytesink::GzipBytesink(Bytesink* next, VekMempool* pool, int level) : pStateM(new (std::nothrow) State) {
+  if (!pStateM) return;
   pStateM->pNextM = next;
   pStateM->levelM = level;
   pStateM->pMempoolM = pool;
 }
 
 GzipBytesink::~GzipBytesink() {
+  if (!pStateM) return;
   if (pStateM->isPendingM && !pStateM->isErrorM) Flush();
   pStateM->Close();
 }
 
 bool GzipBytesink::Write(const char* data, size_t size) {
+  if (!pStateM) return false;
   State& s = *pStateM;
   if (s.isErrorM) return false;
   if (size == 0) return true;
@@ -108,6 +115,7 @@ bool GzipBytesink::Write(const char* data, size_t size) {
 }
 
 bool GzipBytesink::Flush() {
+  if (!pStateM) return false;
   State& s = *pStateM;
   if (s.isErrorM) return false;
   // A sink flushed before anything was written still holds one (empty) member, so that its
@@ -128,7 +136,7 @@ bool GzipBytesink::Flush() {
   return true;
 }
 
-bool GzipBytesink::FError() const { return pStateM->isErrorM; }
+bool GzipBytesink::FError() const { return !pStateM || pStateM->isErrorM; }
 
 struct GunzipBytesource::State {
   z_stream streamM;
@@ -166,7 +174,12 @@ struct GunzipBytesource::State {
   }
 };
 
-GunzipBytesource::GunzipBytesource(Bytesource* source, VekMempool* pool, bool isOwner) : pStateM(new State) {
+GunzipBytesource::GunzipBytesource(Bytesource* source, VekMempool* pool, bool isOwner)
+    : pStateM(new (std::nothrow) State) {
+  if (!pStateM) {
+    if (isOwner) delete source;
+    return;
+  }
   pStateM->pSourceM = source;
   pStateM->isOwnerM = isOwner;
   pStateM->pMempoolM = pool;
@@ -178,6 +191,7 @@ GunzipBytesource::GunzipBytesource(std::unique_ptr<State> state) : pStateM(std::
 GunzipBytesource::~GunzipBytesource() {}
 
 size_t GunzipBytesource::Read(void* buffer, size_t size) {
+  if (!pStateM) return 0;
   State& s = *pStateM;
   if (s.isEndM || s.pErrorM != nullptr || !s.isOpenM || size == 0) return 0;
   if (size > 0x40000000) size = 0x40000000;
@@ -206,7 +220,7 @@ size_t GunzipBytesource::Read(void* buffer, size_t size) {
         break;
       }
     } else if (status == Z_MEM_ERROR) {
-      s.pErrorM = "out of memory in gzip decoder";
+      s.pErrorM = kOutOfMemoryText;
       break;
     } else if (status != Z_OK) {
       s.pErrorM = "corrupt gzip stream";
@@ -219,10 +233,15 @@ size_t GunzipBytesource::Read(void* buffer, size_t size) {
 }
 
 Bytesource* GunzipBytesource::Duplicate() {
+  if (!pStateM) return nullptr;
   State& s = *pStateM;
   Bytesource* source = s.pSourceM->Duplicate();
   if (source == nullptr) return nullptr;
-  std::unique_ptr<State> copy(new State);
+  std::unique_ptr<State> copy(new (std::nothrow) State);
+  if (!copy) {
+    delete source;
+    return nullptr;
+  }
   copy->pSourceM = source;
   copy->isOwnerM = true;
   copy->pMempoolM = s.pMempoolM;
@@ -244,11 +263,14 @@ Bytesource* GunzipBytesource::Duplicate() {
     copy->streamM.next_in = copy->inM;
     copy->streamM.avail_in = static_cast<uInt>(pending);
   }
-  return new GunzipBytesource(std::move(copy));
+  return new (std::nothrow) GunzipBytesource(std::move(copy));
 }
 
-bool GunzipBytesource::FError() const { return pStateM->pErrorM != nullptr; }
+bool GunzipBytesource::FError() const { return !pStateM || pStateM->pErrorM != nullptr; }
 
-const char* GunzipBytesource::GetErrorText() const { return pStateM->pErrorM != nullptr ? pStateM->pErrorM : ""; }
+const char* GunzipBytesource::GetErrorText() const {
+  if (!pStateM) return kOutOfMemoryText;
+  return pStateM->pErrorM != nullptr ? pStateM->pErrorM : "";
+}
 
 }  // namespace wynbaselib

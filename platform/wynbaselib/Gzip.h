@@ -9,7 +9,9 @@
 // trailer (an empty source included), ends the output: the bytes decoded before the fault are
 // delivered, then Read returns 0 and FError() tells it from a clean end, GetErrorText() saying
 // "corrupt gzip stream" or "truncated gzip stream". The source is read 16 KiB at a time.
-// zlib's memory comes from `pool` when one is given, else from the C library.
+// zlib's memory comes from `pool` when one is given, else from the C library. Nothing is thrown
+// when memory runs out: a sink fails (FError), a source ends with FError() and a text saying so,
+// and Duplicate returns null.
 //
 // Neither class is locked: each is used by one thread at a time.
 #pragma once

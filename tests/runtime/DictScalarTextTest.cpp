@@ -11,7 +11,7 @@ namespace {
 
 using sarn::Dict;
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+using sarntest::Str;
 VekString Text(const std::string& text) { return VekString::FromUtf8Bytes(nullptr, text.size(), text.data()); }
 
 std::string PrintfFloat(double value) {

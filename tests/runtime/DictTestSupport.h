@@ -1,8 +1,6 @@
 // Helpers shared by the dictionary, JSON reader and lazy payload tests.
 #pragma once
 
-#include <pthread.h>
-
 #include <functional>
 #include <string>
 #include <string_view>
@@ -15,11 +13,7 @@ namespace dicttest {
 
 using namespace sarn;
 
-inline std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
-
-inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
-  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
-}
+using sarntest::Str;
 
 inline VekString Text(VekMempool* pool, std::string_view text) {
   return VekString::FromUtf8Bytes(pool, text.size(), text.data());
@@ -76,24 +70,6 @@ inline std::string Nested(int depth) {
   return open + close;
 }
 
-// Runs `work` on a thread with a native stack of `bytes` (256 KiB is what the depth limit
-// promises a whole read, write, compare and release fits in). Sanitizers and unoptimised
-// builds multiply frame sizes, so they get more room; the promise is about release builds.
-inline void RunOnStack(size_t bytes, const std::function<void()>& work) {
-#if defined(__SANITIZE_ADDRESS__) || !defined(__OPTIMIZE__)
-  bytes *= 8;
-#endif
-  pthread_attr_t attributes;
-  pthread_attr_init(&attributes);
-  pthread_attr_setstacksize(&attributes, bytes);
-  pthread_t thread;
-  auto call = [](void* argument) -> void* {
-    (*static_cast<const std::function<void()>*>(argument))();
-    return nullptr;
-  };
-  ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
-  pthread_join(thread, nullptr);
-  pthread_attr_destroy(&attributes);
-}
+using sarntest::RunOnStack;
 
 }  // namespace dicttest

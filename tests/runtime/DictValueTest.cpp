@@ -2,6 +2,7 @@
 // release of deep trees.
 #include <algorithm>
 #include <random>
+#include <sstream>
 
 #include "runtime/DictTestSupport.h"
 
@@ -104,14 +105,13 @@ TEST_F(DictValueTest, TypedLookupsAnswerEmptyForOtherKinds) {
   d->Add(VekString("list"), ref<ArrayValue>(new (&poolM) ArrayValue()));
   d->Add(VekString("sub"), ref<Dictionary>(new (&poolM) Dictionary()));
   EXPECT_EQ(Compact(d), R"({"list": [], "sub": {}, "type": "thing"})");
-  EXPECT_EQ(Str(d->GetString(VekString("type"))), "thing");
-  EXPECT_EQ(Str(d->GetString(VekString("list"))), "");
-  EXPECT_EQ(Str(d->GetString(VekString("absent"))), "");
-  EXPECT_TRUE(d->GetArray(VekString("list")));
-  EXPECT_FALSE(d->GetArray(VekString("sub")));
-  EXPECT_TRUE(d->GetDictionary(VekString("sub")));
-  EXPECT_FALSE(d->GetDictionary(VekString("type")));
-  EXPECT_FALSE(d->Get(VekString("absent")));
+  EXPECT_EQ(Str(d->GetString(VekString("type"))) + "|" + Str(d->GetString(VekString("list"))) + "|" +
+                Str(d->GetString(VekString("absent"))),
+            "thing||");
+  EXPECT_EQ(std::vector<bool>({bool(d->GetArray(VekString("list"))), bool(d->GetArray(VekString("sub"))),
+                               bool(d->GetDictionary(VekString("sub"))), bool(d->GetDictionary(VekString("type"))),
+                               bool(d->Get(VekString("absent")))}),
+            std::vector<bool>({true, false, true, false, false}));
   EXPECT_EQ(Compact(Dictionary::New(&poolM, VekString())), "{}");
 }
 
@@ -208,34 +208,27 @@ TEST_F(DictValueTest, EqualityFollowsTheReceiversRule) {
 }
 
 TEST_F(DictValueTest, TypedReadersConvertOrLeaveTheOutputAlone) {
-  auto text = [this](const char* t) { return StringValue::Make(t, &poolM); };
-  int i = 99;
-  EXPECT_FALSE(text("2147483648")->GetValue(i));
-  EXPECT_EQ(i, 99);
-  EXPECT_TRUE(text("-2147483648")->GetValue(i));
-  EXPECT_EQ(i, -2147483647 - 1);
-  unsigned int u = 5;
-  EXPECT_FALSE(text("4294967296")->GetValue(u));
-  EXPECT_TRUE(text("4294967295")->GetValue(u));
-  EXPECT_EQ(u, 4294967295u);
-  bool b = false;
-  EXPECT_FALSE(text("True")->GetValue(b));
-  EXPECT_TRUE(text("true")->GetValue(b));
-  EXPECT_TRUE(b);
-  long long ll = 0;
-  EXPECT_TRUE(text("12abc")->GetValue(ll));
-  EXPECT_EQ(ll, 12);
-  EXPECT_FALSE(text("abc")->GetValue(ll));
-  double d = 0;
-  EXPECT_TRUE(text("-1.5e3")->GetValue(d));
-  EXPECT_EQ(d, -1500.0);
-  unsigned long long ull = 0;
-  EXPECT_TRUE(text("18446744073709551615")->GetValue(ull));
-  EXPECT_EQ(ull, 18446744073709551615ULL);
+  // The value read from `text` into `out`, or "no" and what `out` held afterwards.
+  auto read = [this](const char* text, auto out) {
+    bool fOk = StringValue::Make(text, &poolM)->GetValue(out);
+    std::ostringstream printed;
+    printed << (fOk ? "" : "no ") << out;
+    return printed.str();
+  };
+  EXPECT_EQ(read("2147483648", int(99)), "no 99");
+  EXPECT_EQ(read("-2147483648", int(0)), "-2147483648");
+  EXPECT_EQ(read("4294967296", 5u), "no 5");
+  EXPECT_EQ(read("4294967295", 5u), "4294967295");
+  EXPECT_EQ(read("True", false), "no 0");
+  EXPECT_EQ(read("true", false), "1");
+  EXPECT_EQ(read("12abc", 0LL), "12");
+  EXPECT_EQ(read("abc", 7LL), "no 7");
+  EXPECT_EQ(read("-1.5e3", 0.0), "-1500");
+  EXPECT_EQ(read("18446744073709551615", 0ULL), "18446744073709551615");
   ref<vek::ByteBuffer> bytes;
-  EXPECT_TRUE(text("Zm9v")->GetValue(bytes));
+  EXPECT_TRUE(StringValue::Make("Zm9v", &poolM)->GetValue(bytes));
   EXPECT_EQ(Str(bytes), "foo");
-  EXPECT_TRUE(text("!!")->GetValue(bytes));
+  EXPECT_TRUE(StringValue::Make("!!", &poolM)->GetValue(bytes));
   EXPECT_EQ(bytes->GetLength(), 0u);
 }
 

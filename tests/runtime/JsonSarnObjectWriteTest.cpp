@@ -41,56 +41,49 @@ class JsonWriteTest : public sarntest::PoolTest {
   std::string Write(const SarnObject* object, KernoVersion version, const StructInfo* const* defs = nullptr,
                     uint32_t nDefs = 0) {
     JsonSarnObject json(&poolM);
-    if (defs != nullptr) {
-      json.pStructDefsM = defs;
-      json.nStructDefsM = nDefs;
-    }
-    VekString text = json.SarnObjectToJson(object, version);
-    return std::string(text.Utf8(), text.NByte());
+    if (defs != nullptr) json.pStructDefsM = defs, json.nStructDefsM = nDefs;
+    return sarntest::Str(json.SarnObjectToJson(object, version));
   }
 };
 
-TEST_F(JsonWriteTest, TypeStandsBeforeTheLastFieldThatSortsBelowIt) {
+TEST_F(JsonWriteTest, TypeStandsBeforeTheLastFieldThatSortsBelowItInTheVersion) {
   const FieldInfo placeholder = {0, 0, {kPlaceholderTypeBits}, 0, 0, 0, 0};
-  std::vector<FieldInfo> first = {placeholder, Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0),
-                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 7),
-                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 32, 14)};
-  std::vector<FieldInfo> after = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0),
-                                  Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 4)};
-  // apple exists only up to version 9: from 10 on nothing sorts below "type".
-  std::vector<FieldInfo> ranged = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0, 7, 9),
-                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 6)};
+  auto s32 = [](unsigned offset, unsigned nameOffset, unsigned minVersion = 7, unsigned maxVersion = 42) {
+    return Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, offset, nameOffset, minVersion, maxVersion);
+  };
+  std::vector<FieldInfo> first = {placeholder, s32(24, 0), s32(28, 7), s32(32, 14)};
+  std::vector<FieldInfo> after = {s32(24, 0), s32(28, 4)};
+  std::vector<FieldInfo> ranged = {s32(24, 0, 7, 9), s32(28, 6)};  // apple up to 9: then nothing sorts below "type"
+  std::vector<FieldInfo> edges = {s32(24, 0, 10, 20), s32(28, 2, 21, 42), s32(32, 4, 7, 7)};
   StructInfo a = Struct("a", nullptr, first, "bodyId\0number\0sourceProductDescription");
   StructInfo b = Struct("b", nullptr, after, "uri\0value");
   StructInfo c = Struct("c", nullptr, {}, "");
   StructInfo d = Struct("d", nullptr, ranged, "apple\0zebra");
-  const StructInfo* defs[] = {nullptr, &a, &b, &c, &d};
-
-  RawObject oa(1), ob(2), oc(3), od(4);
-  EXPECT_EQ(Write(&oa, 0, defs, 5), "{\"bodyId\": 0, \"number\": 0, \"type\": \"a\", \"sourceProductDescription\": 0}");
-  EXPECT_EQ(Write(&ob, 42, defs, 5), "{\"uri\": 0, \"value\": 0, \"type\": \"b\"}");
-  EXPECT_EQ(Write(&oc, 42, defs, 5), "{\"type\": \"c\"}");
-  EXPECT_EQ(Write(&od, 9, defs, 5), "{\"type\": \"d\", \"apple\": 0, \"zebra\": 0}");
-  EXPECT_EQ(Write(&od, 10, defs, 5), "{\"zebra\": 0, \"type\": \"d\"}");
-  // An object whose type id names no table entry has nothing to say.
-  RawObject unknown(9);
-  EXPECT_EQ(Write(&unknown, 0, defs, 5), "{}");
-}
-
-TEST_F(JsonWriteTest, VersionFilterAtTheEdgesOfRanges) {
-  std::vector<FieldInfo> fields = {Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 24, 0, 10, 20),
-                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 28, 2, 21, 42),
-                                   Field(SARN_DATA_TYPE_S32, SARN_ARITY_REQUIRED, 32, 4, 7, 7)};
-  StructInfo t = Struct("zz", nullptr, fields, "u\0v\0w");
-  const StructInfo* defs[] = {nullptr, &t};
-  RawObject o(1);
-  EXPECT_EQ(Write(&o, 7, defs, 2), "{\"w\": 0, \"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 9, defs, 2), "{\"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 10, defs, 2), "{\"u\": 0, \"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 20, defs, 2), "{\"u\": 0, \"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 21, defs, 2), "{\"v\": 0, \"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 43, defs, 2), "{\"type\": \"zz\"}");
-  EXPECT_EQ(Write(&o, 0, defs, 2), "{\"u\": 0, \"v\": 0, \"w\": 0, \"type\": \"zz\"}");
+  StructInfo zz = Struct("zz", nullptr, edges, "u\0v\0w");
+  const StructInfo* defs[] = {nullptr, &a, &b, &c, &d, &zz};
+  const struct {
+    uint32_t typeId;  // 9 names no table entry: such an object has nothing to say
+    KernoVersion version;
+    const char* json;
+  } cases[] = {
+      {1, 0, "{\"bodyId\": 0, \"number\": 0, \"type\": \"a\", \"sourceProductDescription\": 0}"},
+      {2, 42, "{\"uri\": 0, \"value\": 0, \"type\": \"b\"}"},
+      {3, 42, "{\"type\": \"c\"}"},
+      {4, 9, "{\"type\": \"d\", \"apple\": 0, \"zebra\": 0}"},
+      {4, 10, "{\"zebra\": 0, \"type\": \"d\"}"},
+      {9, 0, "{}"},
+      {5, 7, "{\"w\": 0, \"type\": \"zz\"}"},
+      {5, 9, "{\"type\": \"zz\"}"},
+      {5, 10, "{\"u\": 0, \"type\": \"zz\"}"},
+      {5, 20, "{\"u\": 0, \"type\": \"zz\"}"},
+      {5, 21, "{\"v\": 0, \"type\": \"zz\"}"},
+      {5, 43, "{\"type\": \"zz\"}"},
+      {5, 0, "{\"u\": 0, \"v\": 0, \"w\": 0, \"type\": \"zz\"}"},
+  };
+  for (const auto& k : cases) {
+    RawObject object(k.typeId);
+    EXPECT_EQ(Write(&object, k.version, defs, 6), k.json) << k.typeId << " at " << k.version;
+  }
 }
 
 TEST_F(JsonWriteTest, UnsignedIdsAndUnknownDataTypes) {
@@ -140,15 +133,12 @@ TEST_F(JsonWriteTest, ValuesOfOptionalAndMultiFields) {
   auto* t = static_cast<sarnschema::TestAllTypes*>(all.Get());
   for (int v : {1, 2, 3}) t->intMultiM.Add(&v);
   t->longOptionalM = -1;
-  t->fHasLongOptionalM = true;
   t->enumOptionalM = 9;
-  t->fHasEnumOptionalM = true;
   t->floatOptionalM = 123456789.0;
-  t->fHasFloatOptionalM = true;
   t->stringOptionalM = VekString::FromUtf8Bytes(&poolM, 9, "q\"b\\t\tu\\u");
-  t->fHasStringOptionalM = true;
   t->idLongOptionalM = (5ull << 48) + 12;
-  t->fHasIdLongOptionalM = true;
+  t->fHasLongOptionalM = t->fHasEnumOptionalM = t->fHasFloatOptionalM = t->fHasStringOptionalM =
+      t->fHasIdLongOptionalM = true;
   uint8_t flags[] = {1, 0};
   t->booleanMultiM.Add(&flags[0]);
   t->booleanMultiM.Add(&flags[1]);
@@ -158,14 +148,13 @@ TEST_F(JsonWriteTest, ValuesOfOptionalAndMultiFields) {
   t->structMultiM.Add(nullptr);
   t->unionMultiM.Add(nullptr);
   std::string json = Write(t, 0);
-  EXPECT_NE(json.find("\"booleanMulti\": [true,false]"), std::string::npos) << json;
-  EXPECT_NE(json.find("\"enumOptional\": \"INVALID_VALUE:9\""), std::string::npos) << json;
-  EXPECT_NE(json.find("\"floatOptional\": \"1.2345679e+08\""), std::string::npos) << json;
-  EXPECT_NE(json.find("\"idLongOptional\": \"vask:ct.tms.ep.12\""), std::string::npos) << json;
-  EXPECT_NE(json.find("\"intMulti\": [1,2,3]"), std::string::npos) << json;
-  EXPECT_NE(json.find("\"longOptional\": \"-1\""), std::string::npos) << json;
-  EXPECT_NE(json.find("\"stringOptional\": \"q\\\"b\\\\t\\tu\\u\""), std::string::npos) << json;
-  EXPECT_NE(json.find("\"structMulti\": [{\"type\": \"success\"}], \"time\""), std::string::npos) << json;
+  for (const char* part : {"\"booleanMulti\": [true,false]", "\"enumOptional\": \"INVALID_VALUE:9\"",
+                           "\"floatOptional\": \"1.2345679e+08\"", "\"idLongOptional\": \"vask:ct.tms.ep.12\"",
+                           "\"intMulti\": [1,2,3]", "\"longOptional\": \"-1\"",
+                           "\"stringOptional\": \"q\\\"b\\\\t\\tu\\u\"",
+                           "\"structMulti\": [{\"type\": \"success\"}], \"time\""}) {
+    EXPECT_NE(json.find(part), std::string::npos) << part << " in " << json;
+  }
   EXPECT_EQ(json.find("unionMulti"), std::string::npos) << json;
   EXPECT_EQ(json.find("\"stringMulti\""), std::string::npos) << json;
 }

@@ -8,7 +8,7 @@ namespace {
 
 using JsonTextTest = sarntest::PoolTest;
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+using sarntest::Str;
 
 // A source that delivers the given chunks, one per Read (a chunk larger than the request is
 // handed out in pieces).
@@ -58,30 +58,23 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
   return fromBuffer;
 }
 
-TEST(JsonWriteTest, QuotingFollowsTheBareRule) {
-  EXPECT_EQ(ToJson("abc-1", true), "abc-1");
-  EXPECT_EQ(ToJson("abc-1", false), "\"abc-1\"");
-  EXPECT_EQ(ToJson("-7", true), "-7");
-  EXPECT_EQ(ToJson("1.5", true), "\"1.5\"");
-  EXPECT_EQ(ToJson("", true), "\"\"");
-  EXPECT_EQ(ToJson("", false), "\"\"");
-  EXPECT_EQ(ToJson("a b", true), "\"a b\"");
-  EXPECT_EQ(ToJson("\xC3\xA9", true), "\"\xC3\xA9\"") << "non-ASCII letters are not bare";
-  // Only the bytes before the first NUL decide; every byte is still written.
-  EXPECT_EQ(ToJson(std::string("ab\0c d", 6), true), "ab\\u0000c d");
-}
-
-TEST(JsonWriteTest, EscapesExactly) {
-  EXPECT_EQ(ToJson("\\u00e9", false), "\"\\u00e9\"") << "a backslash-u passes through";
-  EXPECT_EQ(ToJson("\\b", false), "\"\\\\b\"");
-  EXPECT_EQ(ToJson("a\\", false), "\"a\\\\\"") << "a final backslash is doubled";
-  EXPECT_EQ(ToJson("\\\\u", false), "\"\\\\\\u\"");
-  EXPECT_EQ(ToJson("\x01", false), "\"\\u0001\"");
-  EXPECT_EQ(ToJson("\x1F", false), "\"\\u001F\"");
-  EXPECT_EQ(ToJson(std::string("\0", 1), false), "\"\\u0000\"");
-  EXPECT_EQ(ToJson("\x03\x1A\x7F/\xC3\xA9", false), "\"\x03\x1A\x7F/\xC3\xA9\"");
-  EXPECT_EQ(ToJson("\b\t\n\f\r\"x", false), "\"\\b\\t\\n\\f\\r\\\"x\"");
-  EXPECT_EQ(ToJson("\x0B\x1B", false), "\"\\u000B\\u001B\"");
+TEST(JsonWriteTest, QuotesByTheBareRuleAndEscapesExactly) {
+  const struct {
+    std::string text;
+    bool fBareAllowed;
+    std::string json;
+  } cases[] = {
+      {"abc-1", true, "abc-1"}, {"abc-1", false, "\"abc-1\""}, {"-7", true, "-7"}, {"1.5", true, "\"1.5\""},
+      {"", true, "\"\""}, {"", false, "\"\""}, {"a b", true, "\"a b\""},
+      {"\xC3\xA9", true, "\"\xC3\xA9\""},  // non-ASCII letters are not bare
+      {std::string("ab\0c d", 6), true, "ab\\u0000c d"},  // only the bytes before the first NUL decide
+      {"\\u00e9", false, "\"\\u00e9\""},  // a backslash-u passes through
+      {"\\b", false, "\"\\\\b\""}, {"a\\", false, "\"a\\\\\""}, {"\\\\u", false, "\"\\\\\\u\""},
+      {"\x01", false, "\"\\u0001\""}, {"\x1F", false, "\"\\u001F\""}, {std::string("\0", 1), false, "\"\\u0000\""},
+      {"\x03\x1A\x7F/\xC3\xA9", false, "\"\x03\x1A\x7F/\xC3\xA9\""},
+      {"\b\t\n\f\r\"x", false, "\"\\b\\t\\n\\f\\r\\\"x\""}, {"\x0B\x1B", false, "\"\\u000B\\u001B\""},
+  };
+  for (const auto& c : cases) EXPECT_EQ(ToJson(c.text, c.fBareAllowed), c.json) << c.text;
 }
 
 TEST(JsonWriteTest, LongTextsAndSinkFailures) {
@@ -102,19 +95,15 @@ TEST(JsonWriteTest, LongTextsAndSinkFailures) {
 }
 
 TEST(JsonWriteTest, EscapedCharToChar) {
-  const char* letters = "\"/\\bfnrt";
-  const char meanings[] = {'"', '/', '\\', '\b', '\f', '\n', '\r', '\t'};
-  for (int i = 0; i < 8; ++i) {
-    char result = 0;
-    EXPECT_TRUE(sarn::Json::EscapedCharToChar(letters[i], result));
-    EXPECT_EQ(result, meanings[i]);
-  }
+  // Each byte after a backslash: its meaning, or 'z' (left alone) when it is no escape.
+  std::string meanings;
   for (int c = 0; c < 256; ++c) {
     char result = 'z';
-    if (std::strchr(letters, c) != nullptr && c != 0) continue;
-    EXPECT_FALSE(sarn::Json::EscapedCharToChar(static_cast<char>(c), result)) << c;
-    EXPECT_EQ(result, 'z');
+    bool fOk = sarn::Json::EscapedCharToChar(static_cast<char>(c), result);
+    EXPECT_EQ(fOk, result != 'z') << c;
+    if (fOk) meanings += std::string(1, static_cast<char>(c)) + result;
   }
+  EXPECT_EQ(meanings, "\"\"//\\\\b\bf\fn\nr\rt\t");
 }
 
 struct ReadResult {
@@ -143,54 +132,33 @@ ReadResult ReadSource(VekMempool* pool, const std::vector<std::string_view>& chu
   return {fOk, Str(result), consumed};
 }
 
-TEST_F(JsonTextTest, MemoryReaderStringsAndBareTokens) {
-  ReadResult r = ReadMemory(&poolM, "  \"x\\ty\"rest");
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "x\ty");
-  EXPECT_EQ(r.consumed, 8u) << "the cursor rests after the closing quote";
-
-  r = ReadMemory(&poolM, "-12.5e+3,");
-  EXPECT_EQ(r.text, "-12.5e+3");
-  EXPECT_EQ(r.consumed, 8u);
-
-  r = ReadMemory(&poolM, "{\"a\":1}");
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "");
-  EXPECT_EQ(r.consumed, 0u);
-
-  r = ReadMemory(&poolM, " \t\r\n");
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "");
-  EXPECT_EQ(r.consumed, 4u);
-
-  r = ReadMemory(&poolM, "\f1");
-  EXPECT_EQ(r.text, "") << "form feed is not whitespace";
-  EXPECT_EQ(r.consumed, 0u);
-
-  r = ReadMemory(&poolM, "\"a\\u00e9b\"");
-  EXPECT_EQ(r.text, "a\\u00e9b");
-
-  r = ReadMemory(&poolM, "\"abc");
-  EXPECT_TRUE(r.fOk) << "the end of the range closes the string";
-  EXPECT_EQ(r.text, "abc");
-  EXPECT_EQ(r.consumed, 4u);
-
-  r = ReadMemory(&poolM, "\"\\/\\\\\\\"\\b\\f\\n\\r\\t|\"");
-  EXPECT_EQ(r.text, "/\\\"\b\f\n\r\t|");
-
-  r = ReadMemory(&poolM, "\"\"x");
-  EXPECT_TRUE(r.fOk);
-  EXPECT_EQ(r.text, "");
-  EXPECT_EQ(r.consumed, 2u);
-}
-
-TEST_F(JsonTextTest, MemoryReaderFailures) {
-  for (std::string_view bad : {std::string_view("\"a\\q\""), std::string_view("\"a\\"),
-                               std::string_view("\"a\0b\"", 5), std::string_view("\"\0\"", 3),
-                               std::string_view("\"x\\n\\x\"")}) {
-    ReadResult r = ReadMemory(&poolM, bad);
-    EXPECT_FALSE(r.fOk) << bad;
-    EXPECT_EQ(r.text, "untouched") << "the result is left alone on failure";
+TEST_F(JsonTextTest, MemoryReaderStringsBareTokensAndFailures) {
+  const struct {
+    std::string input;
+    bool fOk;
+    std::string text;  // "untouched": the result is left alone on failure
+    size_t consumed;   // bytes the cursor moved
+  } cases[] = {
+      {"  \"x\\ty\"rest", true, "x\ty", 8},  // the cursor rests after the closing quote
+      {"-12.5e+3,", true, "-12.5e+3", 8},
+      {"{\"a\":1}", true, "", 0},
+      {" \t\r\n", true, "", 4},
+      {"\f1", true, "", 0},  // form feed is not whitespace
+      {"\"a\\u00e9b\"", true, "a\\u00e9b", 10},
+      {"\"abc", true, "abc", 4},  // the end of the range closes the string
+      {"\"\\/\\\\\\\"\\b\\f\\n\\r\\t|\"", true, "/\\\"\b\f\n\r\t|", 19},
+      {"\"\"x", true, "", 2},
+      {"\"a\\q\"", false, "untouched", 0},
+      {"\"a\\", false, "untouched", 0},
+      {std::string("\"a\0b\"", 5), false, "untouched", 0},
+      {std::string("\"\0\"", 3), false, "untouched", 0},
+      {"\"x\\n\\x\"", false, "untouched", 0},
+  };
+  for (const auto& c : cases) {
+    ReadResult r = ReadMemory(&poolM, c.input);
+    EXPECT_EQ(r.fOk, c.fOk) << c.input;
+    EXPECT_EQ(r.text, c.text) << c.input;
+    EXPECT_TRUE(!c.fOk || r.consumed == c.consumed) << c.input << " consumed " << r.consumed;
   }
 }
 
@@ -199,21 +167,16 @@ TEST_F(JsonTextTest, MemoryReaderInterns) {
   VekString stored = VekString::FromUtf8Bytes(&poolM, 4, "name");
   table.Put(stored, stored);
   table.Put(VekString::FromUtf8Bytes(&poolM, 5, "empty"), VekString());
-  VekString out;
-  ReadMemory(&poolM, "\"name\"", &table, &out);
-  EXPECT_EQ(out.GetRep(), stored.GetRep()) << "the stored instance is returned";
-  ReadMemory(&poolM, "na\\me", &table, &out);
-  EXPECT_EQ(Str(out), "na");
-  ReadMemory(&poolM, "\"n\\u0061me\"", &table, &out);
-  EXPECT_NE(out.GetRep(), stored.GetRep());
-  ReadMemory(&poolM, "\"na\\/me\"", &table, &out);
-  EXPECT_EQ(Str(out), "na/me");
-  ReadMemory(&poolM, "\"nam\\u0065\"", &table, &out);
-  EXPECT_EQ(Str(out), "nam\\u0065");
-  ReadMemory(&poolM, "empty", &table, &out);
-  EXPECT_EQ(Str(out), "empty") << "an empty stored value is not used";
-  ReadMemory(&poolM, "name", &table, &out);
-  EXPECT_EQ(out.GetRep(), stored.GetRep()) << "bare tokens are interned too";
+  // Quoted and bare tokens whose text is stored come back as the stored instance; an empty
+  // stored value is not used.
+  const std::pair<std::string, std::string> cases[] = {
+      {"\"name\"", "stored"}, {"name", "stored"}, {"na\\me", "na"}, {"\"n\\u0061me\"", "n\\u0061me"},
+      {"\"na\\/me\"", "na/me"}, {"\"nam\\u0065\"", "nam\\u0065"}, {"empty", "empty"}};
+  for (const auto& [input, expected] : cases) {
+    VekString out;
+    ReadMemory(&poolM, input, &table, &out);
+    EXPECT_EQ(out.GetRep() == stored.GetRep() ? "stored" : Str(out), expected) << input;
+  }
   EXPECT_EQ(table.Count(), 2u);
 }
 

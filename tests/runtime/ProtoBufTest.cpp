@@ -2,7 +2,6 @@
 // reader, each refusal of the reader, any-dicts, the version-1 envelope reader and its texts, and
 // the nesting limit at N and N+1.
 #include <gtest/gtest.h>
-#include <pthread.h>
 
 #include <functional>
 #include <string>
@@ -17,12 +16,7 @@ namespace {
 
 constexpr unsigned kTestAllTypes = 1259;
 
-std::string Finished(ProtoBufByteOutputStream& out) {
-  const unsigned char* data;
-  unsigned long length;
-  out.Finish(data, length);
-  return std::string(reinterpret_cast<const char*>(data), length);
-}
+const unsigned char* U(const std::string& bytes) { return reinterpret_cast<const unsigned char*>(bytes.data()); }
 
 class ProtoBufTest : public sarntest::PoolTest {
  protected:
@@ -30,23 +24,23 @@ class ProtoBufTest : public sarntest::PoolTest {
   std::string Write(const std::function<void(const ProtoBuf&, ProtoBufByteOutputStream*)>& write) {
     ProtoBufByteOutputStream out;
     write(Codec(), &out);
-    return Finished(out);
+    const unsigned char* data;
+    unsigned long length;
+    out.Finish(data, length);
+    return std::string(reinterpret_cast<const char*>(data), length);
+  }
+  std::string Known(const SarnObject* object) {
+    return Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(object, out); });
   }
   ref<SarnObject> Make(unsigned typeId) { return StructInfoForId(typeId)->pFactory(&poolM); }
-  const FieldInfo* Field(unsigned typeId, unsigned number) { return &StructInfoForId(typeId)->vFieldInfo[number]; }
-  // Reads `bytes` as the fields of a testAllTypes; the object, or null when the read fails.
+  const FieldInfo& Field(unsigned typeId, unsigned number) { return StructInfoForId(typeId)->vFieldInfo[number]; }
+  // Reads `bytes` as the fields of a `typeId`; the object, or null when the read fails.
   ref<SarnObject> Read(const std::string& bytes, unsigned typeId = kTestAllTypes) {
     ref<SarnObject> object;
-    if (!Codec().Unmarshal(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()),
-                           typeId, &object)) {
-      return nullptr;
-    }
-    return object;
+    return Codec().Unmarshal(U(bytes), static_cast<int>(bytes.size()), typeId, &object) ? object : nullptr;
   }
   std::string Json(const ref<SarnObject>& object) {
-    JsonSarnObject writer(&poolM);
-    VekString text = writer.SarnObjectToJson(object.Get(), 0);
-    return std::string(text.Utf8(), text.NByte());
+    return sarntest::Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0));
   }
   std::string ErrorText(const ref<SarnObject>& object) {
     if (!object || object->GetTypeId() != sarnschema::Error::TYPE_ID) return "<not an error>";
@@ -62,34 +56,28 @@ TEST_F(ProtoBufTest, WriterGivesExactBytes) {
   ref<SarnObject> all = Make(kTestAllTypes);
   int minusOne = -1;
   double one = 1.0;
-  FieldAccess::PutScalar(all.Get(), *Field(kTestAllTypes, 43), &minusOne);
-  FieldAccess::PutScalar(all.Get(), *Field(kTestAllTypes, 22), &one);
-  for (uint32_t day : {1u, 2u}) FieldAccess::PutScalar(all.Get(), *Field(kTestAllTypes, 20), &day);
-  EXPECT_EQ(Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) {
-              p.MarshalSingleField(Field(kTestAllTypes, 43), all.Get(), out);
-            }),
-            "\x01");
-  EXPECT_EQ(Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) {
-              p.MarshalSingleField(Field(kTestAllTypes, 22), all.Get(), out);
-            }),
-            std::string("\0\0\0\0\0\0\xF0\x3F", 8));
-  EXPECT_EQ(Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) {
-              p.MarshalMultiField(0x28, Field(kTestAllTypes, 20), all.Get(), out);
-            }),
-            "\x28\x01\x28\x02");
-
+  FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 43), &minusOne);
+  FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 22), &one);
+  for (uint32_t day : {1u, 2u}) FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 20), &day);
   ref<Dict> dict = Dict::New(&poolM, VekString());
   dict->AddString("a", "b");
-  EXPECT_EQ(Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalAnyDictWithLength(dict.Get(), out); }),
-            "\x0A\x22\x08\x32\x01\x61\x42\x03\x12\x01\x62");
+  const std::pair<std::function<void(const ProtoBuf&, ProtoBufByteOutputStream*)>, std::string> cases[] = {
+      {[&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalSingleField(&Field(kTestAllTypes, 43), all.Get(), out); },
+       "\x01"},
+      {[&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalSingleField(&Field(kTestAllTypes, 22), all.Get(), out); },
+       std::string("\0\0\0\0\0\0\xF0\x3F", 8)},
+      {[&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalMultiField(0x28, &Field(kTestAllTypes, 20), all.Get(), out); },
+       "\x28\x01\x28\x02"},
+      {[&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalAnyDictWithLength(dict.Get(), out); },
+       "\x0A\x22\x08\x32\x01\x61\x42\x03\x12\x01\x62"},
+  };
+  for (const auto& [write, bytes] : cases) EXPECT_EQ(Write(write), bytes);
 
   ref<SarnObject> cancel = Make(974);
   static_cast<sarnschema::KernoRpcCancel*>(cancel.Get())->rpcIdM = 5;
-  std::string cancelBytes =
-      Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(cancel.Get(), out); });
+  std::string cancelBytes = Known(cancel.Get());
   EXPECT_EQ(cancelBytes, "\xF2\x3C\x02\x08\x0A");
-  ref<SarnObject> back = Codec().UnmarshalWrapper(reinterpret_cast<const unsigned char*>(cancelBytes.data()), 5);
-  EXPECT_EQ(Json(back), Json(cancel));
+  EXPECT_EQ(Json(Codec().UnmarshalWrapper(U(cancelBytes), 5)), Json(cancel));
 
   // An optional string whose presence byte is 0 is not written, whatever it holds.
   ref<SarnObject> error = Make(sarnschema::Error::TYPE_ID);
@@ -104,19 +92,16 @@ TEST_F(ProtoBufTest, EveryTypeRoundTrips) {
   int checked = 0;
   for (int id = 0; id < Schema::nStructDefG; ++id) {
     const StructInfo* info = Schema::vStructDefG[id];
-    if (info == nullptr) continue;
-    bool isLazy = false;
-    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+    bool isLazy = info == nullptr;
+    for (unsigned n = 0; !isLazy && n < info->nFieldInfo; ++n) {
       isLazy |= info->vFieldInfo[n].dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
     }
     if (isLazy) continue;
     ref<SarnObject> object = info->pFactory(&poolM);
     sarntest::FillObject(&poolM, object.Get(), static_cast<unsigned>(id), 2);
-    std::string bytes = Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(object.Get(), out); });
+    std::string bytes = Known(object.Get());
     ref<SarnObject> back;
-    ASSERT_TRUE(Codec().UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()),
-                                           static_cast<int>(bytes.size()), &back))
-        << info->pName;
+    ASSERT_TRUE(Codec().UnmarshalKnownDict(U(bytes), static_cast<int>(bytes.size()), &back)) << info->pName;
     ASSERT_EQ(Json(back), Json(object)) << info->pName;
     ++checked;
   }
@@ -124,20 +109,21 @@ TEST_F(ProtoBufTest, EveryTypeRoundTrips) {
 }
 
 TEST_F(ProtoBufTest, ReaderRefusesMalformedFieldsAndSkipsUnknownOnes) {
-  struct Case {
+  const std::string out100 = "field number '100' out of range in 'testAllTypes'\n";
+  const struct {
     const char* label;
     std::string bytes;
     bool isOk;
-    const char* printed;
+    std::string printed;
   } cases[] = {
       {"bool 1", "\x20\x01", true, ""},
       {"bool 2", "\x20\x02", false, ""},
-      {"unknown number, varint", "\xA0\x06\x05\x20\x01", true, "field number '100' out of range in 'testAllTypes'\n"},
+      {"unknown number, varint", "\xA0\x06\x05\x20\x01", true, out100},
       {"undefined number", std::string("\x00\x05\x20\x01", 4), true, "field number '0' undefined in 'testAllTypes'\n"},
-      {"unknown number, wire type 5", "\xA5\x06\x01\x02\x03\x04", false, "field number '100' out of range in 'testAllTypes'\n"},
-      {"unknown number, wire type 3", "\xA3\x06", false, "field number '100' out of range in 'testAllTypes'\n"},
-      {"unknown number, wire type 4", "\xA4\x06", false, "field number '100' out of range in 'testAllTypes'\n"},
-      {"unknown number, length past the end", "\xA2\x06\x05\x01", false, "field number '100' out of range in 'testAllTypes'\n"},
+      {"unknown number, wire type 5", "\xA5\x06\x01\x02\x03\x04", false, out100},
+      {"unknown number, wire type 3", "\xA3\x06", false, out100},
+      {"unknown number, wire type 4", "\xA4\x06", false, out100},
+      {"unknown number, length past the end", "\xA2\x06\x05\x01", false, out100},
       {"short float", std::string("\xB1\x01\0\0\0\0\0\0\xF0", 9), false, ""},
       {"invalid channel number", "\x3A\x07invalid", false, ""},
       {"invalid currency", "\x52\x07invalid", false, ""},
@@ -146,27 +132,24 @@ TEST_F(ProtoBufTest, ReaderRefusesMalformedFieldsAndSkipsUnknownOnes) {
       {"sub-object length past the end", "\xBA\x03\x09\x08", false, ""},
       {"known dict of an unknown type", "\xF2\x02\x03\x82\x01\x00", false, ""},
   };
-  for (const Case& c : cases) {
+  for (const auto& c : cases) {
     testing::internal::CaptureStdout();
     ref<SarnObject> object = Read(c.bytes);
     EXPECT_EQ(testing::internal::GetCapturedStdout(), c.printed) << c.label;
     EXPECT_EQ(static_cast<bool>(object), c.isOk) << c.label;
-    if (object) {
-      EXPECT_EQ(FieldAccess::ScalarValue<uint8_t>(object.Get(), *Field(kTestAllTypes, 4), 0), 1) << c.label;
-    }
+    EXPECT_TRUE(!object || FieldAccess::ScalarValue<uint8_t>(object.Get(), Field(kTestAllTypes, 4), 0) == 1) << c.label;
   }
   // A MULTI field holds at most 65,535 elements: one more fails the read rather than being dropped.
-  std::string element = "\x28\x01";
   std::string full;
-  for (int i = 0; i < 65535; ++i) full += element;
+  for (int i = 0; i < 65535; ++i) full += "\x28\x01";
   EXPECT_TRUE(Read(full));
-  EXPECT_FALSE(Read(full + element));
+  EXPECT_FALSE(Read(full + "\x28\x01"));
   // A single field given twice keeps the later value; a MULTI field keeps both.
   ref<SarnObject> twice = Read("\xD8\x02\x02\xD8\x02\x04\xE0\x02\x02\xE0\x02\x04");
   ASSERT_TRUE(twice);
-  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), *Field(kTestAllTypes, 43), 0), 2);
-  ASSERT_EQ(FieldAccess::Count(twice.Get(), *Field(kTestAllTypes, 44)), 2u);
-  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), *Field(kTestAllTypes, 44), 1), 2);
+  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), Field(kTestAllTypes, 43), 0), 2);
+  ASSERT_EQ(FieldAccess::Count(twice.Get(), Field(kTestAllTypes, 44)), 2u);
+  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), Field(kTestAllTypes, 44), 1), 2);
 }
 
 TEST_F(ProtoBufTest, AnyDictsReadBackAndMalformedOnesFail) {
@@ -179,42 +162,30 @@ TEST_F(ProtoBufTest, AnyDictsReadBackAndMalformedOnesFail) {
   dict->AddDict("m", inner);
   dict->GetDictionary()->Add(VekString("n"), ref<NullValue>(new (&poolM) NullValue()));
   std::string bytes = Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalAnyDict(dict.Get(), out); });
-  const unsigned char* cursor = reinterpret_cast<const unsigned char*>(bytes.data());
+  const unsigned char* cursor = U(bytes);
   ref<Dict> back;
   ASSERT_TRUE(Codec().UnmarshalAnyDict(&cursor, cursor + bytes.size(), &back));
   // Names in byte order, both values of "a", the nested dictionary, and the null as an empty one.
   EXPECT_EQ(std::string(back->ToString(false).Utf8()),
             "{\"a\": [\"1\", \"2\"], \"m\": {\"k\": \"v\"}, \"n\": {}, \"z\": \"last\"}");
 
-  struct Case {
-    const char* label;
-    std::string bytes;  // the content of one value section
-  } bad[] = {
-      {"text not last", "\x12\x01x\x12\x01y"},
-      {"text after an entry", "\x22\x03\x32\x01k\x12\x01x"},
-      {"unknown tag", "\x1A\x00"},
-      {"entry without a name", "\x22\x02\x42\x00"},
-      {"entry with an unknown part", "\x22\x05\x32\x01k\x10\x00"},
-      {"length past the end", "\x22\x09\x32\x01k"},
-  };
-  for (const Case& c : bad) {
+  // The content of one value section: text not last, text after an entry, an unknown tag, an
+  // entry without a name, an entry with an unknown part, a length past the end.
+  for (const std::string& bad : {std::string("\x12\x01x\x12\x01y"), std::string("\x22\x03\x32\x01k\x12\x01x"),
+                                 std::string("\x1A\x00", 2), std::string("\x22\x02\x42\x00", 4),
+                                 std::string("\x22\x05\x32\x01k\x10\x00", 7), std::string("\x22\x09\x32\x01k")}) {
     dictvalue::Type kind;
     VekString text;
     ref<Dict> value;
-    const unsigned char* begin = reinterpret_cast<const unsigned char*>(c.bytes.data());
-    EXPECT_FALSE(Codec().UnmarshalAnyDictValue(begin, begin + c.bytes.size(), kind, text, value)) << c.label;
+    EXPECT_FALSE(Codec().UnmarshalAnyDictValue(U(bad), U(bad) + bad.size(), kind, text, value)) << testing::PrintToString(bad);
   }
 }
 
 TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
   // A kernoRpcRequest (tag 975 * 8 + 2 = FA 3C) with rpcId 9 and a cancel as its body.
-  std::string body = "\xF2\x3C\x02\x08\x0A";
-  std::string fields = "\x18\x12\x12" + std::string(1, static_cast<char>(body.size())) + body;
-  std::string request = "\xFA\x3C" + std::string(1, static_cast<char>(fields.size())) + fields;
-  struct Case {
-    std::string bytes;
-    const char* text;  // of the error object; null when the envelope reads
-  } cases[] = {
+  const std::string request = "\xFA\x3C\x09\x18\x12\x12\x05\xF2\x3C\x02\x08\x0A";
+  const std::pair<std::string, const char*> cases[] = {
+      // The text of the error object; null when the envelope reads.
       {"", "does not start with valid int"},
       {"\xF2\x3C\x02\x08", "failed to unmarshal"},
       {"\xF2\x8B\x01", "bad object type: 2238"},
@@ -224,12 +195,11 @@ TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
       {"\xFA\x3C\x02\x08\x02", "wrapper did not unmarshal"},
       {"\x82\x3D\x02\x20\x01", "wrapper did not unmarshal"},
   };
-  for (const Case& c : cases) {
-    ref<SarnObject> object =
-        Codec().UnmarshalWrapper(reinterpret_cast<const unsigned char*>(c.bytes.data()), static_cast<int>(c.bytes.size()));
+  for (const auto& [bytes, text] : cases) {
+    ref<SarnObject> object = Codec().UnmarshalWrapper(U(bytes), static_cast<int>(bytes.size()));
     ASSERT_TRUE(object);
-    if (c.text != nullptr) {
-      EXPECT_EQ(ErrorText(object), c.text) << testing::PrintToString(c.bytes);
+    if (text != nullptr) {
+      EXPECT_EQ(ErrorText(object), text) << testing::PrintToString(bytes);
       continue;
     }
     auto* wrapper = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
@@ -237,13 +207,11 @@ TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
     EXPECT_EQ(Json(wrapper->requestM->ToSarnObjectOrError()), "{\"rpcId\": 5, \"type\": \"kernoRpcCancel\"}");
   }
   // Bodies that do not read become error objects inside readable envelopes.
-  std::string badRequest = "\xFA\x3C\x04\x12\x02\x08\x0A";
-  std::string badResponse = "\x82\x3D\x04\x12\x02\x08\x0A";
-  ref<SarnObject> request2 = Codec().UnmarshalWrapper(reinterpret_cast<const unsigned char*>(badRequest.data()), 7);
-  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcRequest*>(request2.Get())->requestM->ToSarnObjectOrError()),
+  ref<SarnObject> badRequest = Codec().UnmarshalWrapper(U("\xFA\x3C\x04\x12\x02\x08\x0A"), 7);
+  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcRequest*>(badRequest.Get())->requestM->ToSarnObjectOrError()),
             "request did not unmarshal");
-  ref<SarnObject> response = Codec().UnmarshalWrapper(reinterpret_cast<const unsigned char*>(badResponse.data()), 7);
-  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcResponse*>(response.Get())->responseM->ToSarnObjectOrError()),
+  ref<SarnObject> badResponse = Codec().UnmarshalWrapper(U("\x82\x3D\x04\x12\x02\x08\x0A"), 7);
+  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcResponse*>(badResponse.Get())->responseM->ToSarnObjectOrError()),
             "response did not unmarshal");
 }
 
@@ -256,39 +224,20 @@ TEST_F(ProtoBufTest, NestingIsBoundedByTheLimits) {
     for (int i = 1; i < depth; ++i) {
       ref<SarnObject> cause = Make(sarnschema::Error::TYPE_ID);
       static_cast<sarnschema::Error*>(last)->causeM = cause;
-      MarkFieldPresent(last, *Field(sarnschema::Error::TYPE_ID, 5));
+      MarkFieldPresent(last, Field(sarnschema::Error::TYPE_ID, 5));
       last = cause.Get();
     }
-    return Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(top.Get(), out); });
+    return Known(top.Get());
   };
-  struct Run {
-    std::string bytes;
-    ProtoBuf codec;
-    bool isOk;
-  };
-  auto read = [](void* arg) -> void* {
-    Run* run = static_cast<Run*>(arg);
+  auto reads = [](const ProtoBuf& codec, const std::string& bytes) {
     ref<SarnObject> object;
-    run->isOk = run->codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(run->bytes.data()),
-                                              static_cast<int>(run->bytes.size()), &object);
-    return nullptr;
+    return codec.UnmarshalKnownDict(U(bytes), static_cast<int>(bytes.size()), &object);
   };
   for (int depth : {Limits::kDefaultMaxDepth, Limits::kDefaultMaxDepth + 1}) {
-    Run run{chain(depth), Codec(), false};
-    pthread_attr_t attr;
-    pthread_attr_init(&attr);
-#if defined(__SANITIZE_ADDRESS__)
-    pthread_attr_setstacksize(&attr, 8 << 20);  // instrumented frames are several times larger
-#else
-    pthread_attr_setstacksize(&attr, 256 * 1024);
-#endif
-    pthread_t thread;
-    ASSERT_EQ(pthread_create(&thread, &attr, read, &run), 0);
-    pthread_join(thread, nullptr);
-    pthread_attr_destroy(&attr);
-    EXPECT_EQ(run.isOk, depth == Limits::kDefaultMaxDepth) << depth;
+    std::string bytes = chain(depth);
+    bool isOk = false;
+    sarntest::RunOnStack(256 * 1024, [&] { isOk = reads(Codec(), bytes); });
+    EXPECT_EQ(isOk, depth == Limits::kDefaultMaxDepth) << depth;
   }
-  Run small{chain(4), ProtoBuf(&poolM, Schema::vStructDefG, Schema::nStructDefG, Limits(3)), true};
-  read(&small);
-  EXPECT_FALSE(small.isOk);
+  EXPECT_FALSE(reads(ProtoBuf(&poolM, Schema::vStructDefG, Schema::nStructDefG, Limits(3)), chain(4)));
 }

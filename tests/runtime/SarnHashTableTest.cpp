@@ -10,7 +10,7 @@
 
 namespace {
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+using sarntest::Str;
 
 // Reference: lookup3's hashlittle written from its published description with the classic
 // mix/final macros, reading the key through 32-bit little-endian loads of a zero-padded copy.

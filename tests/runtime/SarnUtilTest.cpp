@@ -7,7 +7,7 @@ namespace {
 
 using sarn::SarnUtil;
 
-std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+using sarntest::Str;
 
 TEST(SarnUtilTest, NamespaceOfALongId) {
   EXPECT_EQ(SarnUtil::GetNamespaceForId(0), nullptr);

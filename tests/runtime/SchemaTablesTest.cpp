@@ -1,7 +1,7 @@
 // The compiled default schema: record bytes, object layouts, the representative types field for
-// field, the published statistics, the struct-name table and the field-selection rules.
+// field (tests/data/generator/fields.txt), the published statistics, the struct-name table and the
+// field-selection rules.
 #include <cstring>
-#include <fstream>
 #include <set>
 #include <sstream>
 #include <string>
@@ -20,11 +20,6 @@ const StructInfo* Type(const char* name) {
   return info;
 }
 
-bool IsPlaceholder(const FieldInfo& f) {
-  static const unsigned char kBytes[12] = {0, 0, 0x75, 0, 0, 0, 0, 0, 0, 0, 0, 0};
-  return std::memcmp(&f, kBytes, sizeof kBytes) == 0;
-}
-
 const char* const kDataTypeNames[] = {"bool", "bytestring", "channelNumber", "currency", "date", "dateTime", "anyDict",
                                       "enum", "float", "intId", "longId", "stringId", "knownDict", "knownDictAsLazy",
                                       "subdict", "s64", "s32", "string", "time", "u32", "u64"};
@@ -38,19 +33,24 @@ std::string Describe(const StructInfo* info, const FieldInfo& f) {
   return out.str();
 }
 
-// "n name type arity min-max [ref]" per field number in use, older records indented below.
-std::string Fields(const char* typeName) {
-  const StructInfo* info = Type(typeName);
-  if (info == nullptr) return "";
+// "n name type arity min-max [ref]" per field number in use (or only the one named), older
+// records indented below.
+std::string Fields(const StructInfo* info, const std::string& only = "") {
   std::ostringstream out;
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+  for (unsigned n = 0; info != nullptr && n < info->nFieldInfo; ++n) {
     const FieldInfo& f = info->vFieldInfo[n];
-    if (f.arity == SARN_ARITY_NONE) continue;
+    if (f.arity == SARN_ARITY_NONE || (!only.empty() && only != FieldName(info, f))) continue;
     out << n << " " << Describe(info, f) << "\n";
     const FieldInfoHistory& h = info->vFieldInfoHistory[n];
     for (uint32_t i = 0; i < h.nFieldInfo; ++i) out << "  older " << Describe(info, h.vFieldInfo[i]) << "\n";
   }
   return out.str();
+}
+
+unsigned FieldNumber(const StructInfo* info, const char* name) {
+  unsigned n = 0;
+  while (n < info->nFieldInfo && std::strcmp(FieldName(info, info->vFieldInfo[n]), name) != 0) ++n;
+  return n;
 }
 
 size_t OffsetOf(const void* object, const void* member) {
@@ -76,20 +76,15 @@ TEST(SchemaTables, AddressRecordsByteForByte) {
   EXPECT_STREQ(info->pIdPrefix, "vask:ds.");
   ASSERT_EQ(info->nFieldInfo, 9);
   EXPECT_EQ(std::memcmp(info->vFieldInfo, kRecords, sizeof kRecords), 0);
-  const char* const kNames[] = {"addressId", "city", "country", "levelOfDetail", "postalCode", "state", "street1", "street2"};
-  const int kOffsets[] = {0, 10, 15, 23, 37, 48, 54, 62};
-  for (int i = 0; i < 8; ++i) {
-    EXPECT_EQ(info->vFieldInfo[i + 1].nameOffset, kOffsets[i]);
-    EXPECT_STREQ(info->pFieldNames + kOffsets[i], kNames[i]);
-  }
   EXPECT_EQ(info->pFieldNames, sarnschema::Address::pFieldNamesG);
+  EXPECT_EQ(std::string(info->pFieldNames, 70),
+            std::string("addressId\0city\0country\0levelOfDetail\0postalCode\0state\0street1\0street2\0", 70));
   for (int i = 0; i < 9; ++i) EXPECT_EQ(info->vFieldInfoHistory[i].nFieldInfo, 0u);
   EXPECT_EQ(sizeof(sarnschema::Address), 96u);
-  // The example of the typeBits layout: LONG_ID, optional, flag at byte 24.
-  EXPECT_EQ(info->vFieldInfo[1].typeBits, 0x0C0A);
-  EXPECT_EQ(info->vFieldInfo[1].flagOffset, 24);
-  EXPECT_EQ(info->vFieldInfo[1].dataType, SARN_DATA_TYPE_LONG_ID);
-  EXPECT_EQ(info->vFieldInfo[1].arity, SARN_ARITY_OPTIONAL);
+  // The bit fields over the record's bytes: LONG_ID, optional, flag at byte 24.
+  const FieldInfo& id = info->vFieldInfo[1];
+  EXPECT_EQ(std::vector<int>({id.typeBits, id.flagOffset, id.dataType, id.arity}),
+            std::vector<int>({0x0C0A, 24, SARN_DATA_TYPE_LONG_ID, SARN_ARITY_OPTIONAL}));
 }
 
 TEST(SchemaTables, ObjectLayouts) {
@@ -97,17 +92,13 @@ TEST(SchemaTables, ObjectLayouts) {
   {
     ref<SarnObject> object = sarnschema::ChannelIdentifier::Factory(&pool);
     auto* c = static_cast<sarnschema::ChannelIdentifier*>(object.Get());
-    EXPECT_EQ(OffsetOf(c, &c->typeIdM), 20u);
-    EXPECT_EQ(OffsetOf(c, &c->fHasChannelNumberM), 24u);
-    EXPECT_EQ(OffsetOf(c, &c->fHasPartnerStationIdM), 25u);
-    EXPECT_EQ(OffsetOf(c, &c->fHasSourceTypeM), 26u);
-    EXPECT_EQ(OffsetOf(c, &c->fHasStationIdM), 27u);
-    EXPECT_EQ(OffsetOf(c, &c->channelNumberM), 28u);
-    EXPECT_EQ(c->structInfoG.vFieldInfo[1].valueOffset, 28);
-  }
-  {
-    ref<SarnObject> object = sarnschema::Account::Factory(&pool);
-    auto* a = static_cast<sarnschema::Account*>(object.Get());
+    EXPECT_EQ(std::vector<size_t>({OffsetOf(c, &c->typeIdM), OffsetOf(c, &c->fHasChannelNumberM),
+                                   OffsetOf(c, &c->fHasPartnerStationIdM), OffsetOf(c, &c->fHasSourceTypeM),
+                                   OffsetOf(c, &c->fHasStationIdM), OffsetOf(c, &c->channelNumberM),
+                                   size_t(c->structInfoG.vFieldInfo[1].valueOffset)}),
+              std::vector<size_t>({20, 24, 25, 26, 27, 28, 28}));
+    ref<SarnObject> account = sarnschema::Account::Factory(&pool);
+    auto* a = static_cast<sarnschema::Account*>(account.Get());
     EXPECT_EQ(OffsetOf(a, &a->accountIdM), 24u);
     EXPECT_EQ(OffsetOf(a, &a->bodyIdM), 32u);
     EXPECT_EQ(sizeof(sarnschema::Account), 56u);
@@ -119,64 +110,35 @@ TEST(SchemaTables, ObjectLayouts) {
     if (all->vFieldInfo[n].flagOffset != 0) flags.insert(all->vFieldInfo[n].flagOffset);
     firstValue = std::min<int>(firstValue, all->vFieldInfo[n].valueOffset);
   }
-  EXPECT_EQ(flags.size(), 21u);
-  EXPECT_EQ(*flags.begin(), 24);
-  EXPECT_EQ(*flags.rbegin(), 44);
-  EXPECT_EQ(firstValue, 48);
-  EXPECT_EQ(all->nFieldInfo, 79);
+  EXPECT_EQ(std::vector<int>({int(flags.size()), *flags.begin(), *flags.rbegin(), firstValue, all->nFieldInfo}),
+            std::vector<int>({21, 24, 44, 48, 79}));
   EXPECT_EQ(sizeof(sarnschema::TestAllTypes), 1088u);
   EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }
 
 TEST(SchemaTables, RepresentativeTypesFieldForField) {
-  EXPECT_EQ(Fields("account"), "1 accountId stringId required 7-42 [129]\n2 bodyId string multi 7-42\n");
-  EXPECT_EQ(Fields("channelIdentifier"),
-            "1 channelNumber channelNumber optional 7-42\n2 sourceType enum optional 7-42 [682]\n"
-            "3 stationId longId optional 7-42 [523]\n4 partnerStationId string optional 7-42\n");
-  EXPECT_EQ(Fields("ad"),
-            "1 adBrandId intId required 7-42 [146]\n2 adGroupMapForAdId subdict multi 7-42 [164]\n"
-            "3 adId intId required 7-42 [140]\n4 adInterestForAdId subdict optional 7-42 [169]\n"
-            "5 description string optional 7-42\n6 imageUrl string optional 7-7\n7 isActive bool optional 7-42\n"
-            "8 levelOfDetail enum optional 7-42 [714]\n9 maxStartTime dateTime optional 7-42\n"
-            "10 minEndTime dateTime optional 7-42\n11 offerId stringId required 7-42 [423]\n"
-            "12 shortDescription string required 7-42\n13 title string required 7-42\n14 image subdict multi 7-42 [968]\n");
-  EXPECT_EQ(Fields("assetViewModify"),
-            "1 bodyId string required 7-42\n2 savedPosition string optional 7-42\n3 assetId longId required 13-42 [219]\n"
-            "  older assetId longId optional 7-12 [219]\n4 partnerOfferId string required 11-42\n");
-  EXPECT_EQ(Fields("error"),
-            "1 code enum required 7-42 [702]\n2 debug string optional 7-42\n3 text string required 7-42\n"
-            "4 retryInterval s32 optional 7-42\n5 cause knownDict optional 7-42\n6 traceInfo anyDict optional 27-42\n");
-  EXPECT_EQ(Fields("kernoRpcRequest"),
-            "1 monitorFutureChanges bool required 7-42\n2 request knownDictAsLazy required 7-42\n"
-            "3 rpcId s32 required 7-42\n4 kernoVersion s32 required 7-42\n5 partnerId intId optional 7-42 [433]\n"
-            "6 sendAndForget bool optional 7-42\n7 headers anyDict optional 9-42\n");
-  EXPECT_EQ(Fields("kernoRpcResponse"),
-            "1 isFinalResponse bool required 7-42\n2 response knownDictAsLazy required 7-42\n3 rpcId s32 required 7-42\n"
-            "4 kernoVersion s32 optional 7-42\n5 headers anyDict optional 9-42\n");
-  EXPECT_EQ(Fields("kernoRpcCancel"), "1 rpcId s32 required 7-42\n2 headers anyDict optional 9-42\n");
-  EXPECT_EQ(Fields("kernoRpcRequestUpdate"),
-            "1 headers anyDict optional 9-42\n2 request knownDictAsLazy required 7-42\n3 rpcId s32 required 7-42\n");
-  EXPECT_EQ(Fields("kernoRpcHello"), "1 identity string multi 7-42\n");
-  EXPECT_EQ(Fields("kernoCurrentTimeGet"), "");
-  EXPECT_EQ(Type("kernoCurrentTimeGet")->nFieldInfo, 1);
-
-  // testAllTypes: a required, a multi and an optional field of each kind, in that order.
-  const char* const kKinds[][3] = {
-      {"anyDict", "anyDict", ""}, {"boolean", "bool", ""}, {"channelNumber", "channelNumber", ""},
-      {"currency", "currency", ""}, {"date", "date", ""}, {"dateTime", "dateTime", ""}, {"enum", "enum", " [692]"},
-      {"float", "float", ""}, {"idBase64", "stringId", " [137]"}, {"idBody", "string", ""}, {"idInt", "intId", " [463]"},
-      {"idLong", "longId", " [320]"}, {"idString", "stringId", " [423]"}, {"imageUrl", "string", ""}, {"int", "s32", ""},
-      {"knownDict", "knownDict", ""}, {"long", "s64", ""}, {"string", "string", ""}, {"struct", "subdict", " [543]"},
-      {"time", "time", ""}, {"union", "knownDict", ""}, {"url", "string", ""}, {"idLongAndType", "string", ""},
-      {"uri", "string", ""}, {"bytestring", "bytestring", ""}, {"idAnyBody", "string", ""}};
-  std::ostringstream expected;
-  int n = 1;
-  for (const auto& kind : kKinds) {
-    expected << n++ << " " << kind[0] << " " << kind[1] << " required 7-42" << kind[2] << "\n";
-    expected << n++ << " " << kind[0] << "Multi " << kind[1] << " multi 7-42" << kind[2] << "\n";
-    expected << n++ << " " << kind[0] << "Optional " << kind[1] << " optional 7-42" << kind[2] << "\n";
+  std::string text;
+  ASSERT_TRUE(sarntest::ReadFile(std::string(getenv("SARN_SOURCE_DIR")) + "/tests/data/generator/fields.txt", text));
+  std::istringstream in(text + "\n== end\n");
+  std::string line, section, expected;
+  int sections = 0;
+  while (std::getline(in, line)) {
+    if (line.rfind("== ", 0) == 0) {
+      if (!section.empty()) {
+        size_t dot = section.find('.');
+        EXPECT_EQ(Fields(Type(section.substr(0, dot).c_str()), dot == std::string::npos ? "" : section.substr(dot + 1)),
+                  expected)
+            << section;
+        ++sections;
+      }
+      section = line.substr(3);
+      expected.clear();
+    } else if (!line.empty() && line[0] != '#') {
+      expected += line + "\n";
+    }
   }
-  EXPECT_EQ(Fields("testAllTypes"), expected.str());
+  EXPECT_EQ(sections, 18);
+  EXPECT_EQ(Type("kernoCurrentTimeGet")->nFieldInfo, 1);
 }
 
 TEST(SchemaTables, NamedEnums) {
@@ -199,14 +161,7 @@ TEST(SchemaTables, NamedEnums) {
   EXPECT_TRUE(EnumNameNumber(702, "internalError", number));
   // The video-resolution enum is the one asset.videoResolution names.
   const StructInfo* asset = Type("asset");
-  long resolution = -1;
-  for (unsigned i = 0; i < asset->nFieldInfo; ++i) {
-    if (std::strcmp(FieldName(asset, asset->vFieldInfo[i]), "videoResolution") == 0 &&
-        asset->vFieldInfo[i].arity != SARN_ARITY_NONE) {
-      resolution = asset->vFieldInfo[i].refIndex;
-    }
-  }
-  EXPECT_EQ(names(resolution), "1=sd 100=hd 200=uhd nValue 201");
+  EXPECT_EQ(names(asset->vFieldInfo[FieldNumber(asset, "videoResolution")].refIndex), "1=sd 100=hd 200=uhd nValue 201");
 }
 
 TEST(SchemaTables, TypesIdsNamesAndPrefixes) {
@@ -233,28 +188,22 @@ TEST(SchemaTables, TypesIdsNamesAndPrefixes) {
     if (prefix != "-") {
       ++prefixes;
       distinctPrefixes.insert(prefix);
-      EXPECT_EQ(prefix.rfind("vask:", 0), 0u);
-      EXPECT_EQ(prefix.back(), '.');
+      EXPECT_TRUE(prefix.rfind("vask:", 0) == 0 && prefix.back() == '.') << prefix;
     }
     ++count;
   }
-  EXPECT_EQ(count, 1272);
-  EXPECT_EQ(prefixes, 92);
-  EXPECT_EQ(distinctPrefixes.size(), 92u);
   int filled = 0;
   for (int id = 0; id < Schema::nStructDefG; ++id) filled += Schema::vStructDefG[id] != nullptr;
-  EXPECT_EQ(filled, 1272);
-  EXPECT_EQ(Schema::nStructDefG, 5919);
-  EXPECT_EQ(Schema::nStructTypeG, 1272);
+  EXPECT_EQ(std::vector<int>({count, prefixes, int(distinctPrefixes.size()), filled, Schema::nStructDefG,
+                              Schema::nStructTypeG, Schema::firstSchemaVersionG, Schema::lastSchemaVersionG,
+                              Schema::defaultSchemaVersionG}),
+            std::vector<int>({1272, 92, 92, 1272, 5919, 1272, 7, 42, 42}));
   EXPECT_EQ(StructInfoForId(5919), nullptr);
   EXPECT_EQ(StructInfoForId(-1), nullptr);
-  EXPECT_NE(Type("channelMapConfigInstructions"), nullptr);
-  EXPECT_EQ(Schema::firstSchemaVersionG, 7);
-  EXPECT_EQ(Schema::lastSchemaVersionG, 42);
-  EXPECT_EQ(Schema::defaultSchemaVersionG, 42);
 }
 
 TEST(SchemaTables, PublishedStatistics) {
+  static const unsigned char kPlaceholder[12] = {0, 0, 0x75, 0, 0, 0, 0, 0, 0, 0, 0, 0};
   int records = 0, placeholders = 0, largest = 0, alphabetical = 0, olderFields = 0;
   std::string largestName;
   std::set<std::string> typesWithOlder;
@@ -269,164 +218,97 @@ TEST(SchemaTables, PublishedStatistics) {
     std::vector<std::string> sinceFirst;
     for (unsigned n = 0; n < info->nFieldInfo; ++n) {
       const FieldInfo& f = info->vFieldInfo[n];
-      if (IsPlaceholder(f)) {
+      if (std::memcmp(&f, kPlaceholder, sizeof kPlaceholder) == 0) {
         ++placeholders;
         continue;
       }
       EXPECT_NE(f.arity, SARN_ARITY_NONE);
       if (f.minVersion == Schema::firstSchemaVersionG) sinceFirst.push_back(FieldName(info, f));
+      // Fields found through a reference name a real enum or type; lazy payloads are required.
+      EXPECT_TRUE(f.dataType != SARN_DATA_TYPE_ENUM || EnumDefForId(f.refIndex) != nullptr) << info->pName;
+      EXPECT_TRUE(f.dataType != SARN_DATA_TYPE_SUBDICT || StructInfoForId(f.refIndex) != nullptr) << info->pName;
+      EXPECT_TRUE(f.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY || f.arity == SARN_ARITY_REQUIRED) << info->pName;
       const FieldInfoHistory& h = info->vFieldInfoHistory[n];
-      if (h.nFieldInfo != 0) {
-        EXPECT_EQ(h.nFieldInfo, 1u) << info->pName;
-        ++olderFields;
-        typesWithOlder.insert(info->pName);
+      // Exactly the optional records that hold no reference, older ones included, carry a flag.
+      for (uint32_t i = 0; i <= h.nFieldInfo; ++i) {
+        const FieldInfo& r = i == 0 ? f : h.vFieldInfo[i - 1];
+        bool isReference = FieldAccess::StorageOf(r.dataType) == FieldAccess::STORAGE_REFERENCE;
+        EXPECT_EQ(r.flagOffset != 0, r.arity == SARN_ARITY_OPTIONAL && !isReference) << info->pName << " " << n;
       }
+      if (h.nFieldInfo == 0) continue;
+      EXPECT_EQ(h.nFieldInfo, 1u) << info->pName;
+      // An older representation keeps its own slot under the same name.
+      EXPECT_NE(h.vFieldInfo[0].valueOffset, f.valueOffset) << info->pName;
+      EXPECT_EQ(h.vFieldInfo[0].nameOffset, f.nameOffset) << info->pName;
+      ++olderFields;
+      typesWithOlder.insert(info->pName);
     }
     alphabetical += std::is_sorted(sinceFirst.begin(), sinceFirst.end());
   }
-  EXPECT_EQ(records, 10535);
-  EXPECT_EQ(placeholders, 1803);
+  EXPECT_EQ(std::vector<int>({records, placeholders, largest, olderFields, int(typesWithOlder.size()), alphabetical}),
+            std::vector<int>({10535, 1803, 197, 19, 15, 975}));
   EXPECT_EQ(largestName, "recording");
-  EXPECT_EQ(largest, 197);
-  EXPECT_EQ(olderFields, 19);
-  EXPECT_EQ(typesWithOlder.size(), 15u);
-  EXPECT_EQ(alphabetical, 975);
 
   int enums = 0, withGaps = 0;
   for (int id = 0; id < Schema::nEnumDefG; ++id) {
     const EnumDef* def = Schema::vEnumDefG[id];
     if (def == nullptr) continue;
     ++enums;
-    EXPECT_GE(id, 668);
-    EXPECT_LE(id, 5800);
+    EXPECT_TRUE(id >= 668 && id <= 5800) << id;
     EXPECT_EQ(StructInfoForId(id), nullptr) << "enum id " << id << " is also a type id";
     bool gap = false;
     for (uint64_t i = 0; i < def->nValue; ++i) gap = gap || def->vName[i] == nullptr;
     withGaps += gap;
   }
-  EXPECT_EQ(enums, 378);
-  EXPECT_EQ(Schema::nEnumTypeG, 378);
-  EXPECT_EQ(Schema::nEnumDefG, 5801);
-  EXPECT_EQ(withGaps, 346);
-  EXPECT_NE(Schema::vEnumDefG[668], nullptr);
-  EXPECT_NE(Schema::vEnumDefG[5800], nullptr);
-
-  // Fields whose storage every caller finds through a reference to a type must name a real one,
-  // and enum fields a real enum.
-  for (int id = 0; id < Schema::nStructDefG; ++id) {
-    const StructInfo* info = Schema::vStructDefG[id];
-    if (info == nullptr) continue;
-    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-      const FieldInfo& f = info->vFieldInfo[n];
-      if (f.dataType == SARN_DATA_TYPE_ENUM) {
-        EXPECT_NE(EnumDefForId(f.refIndex), nullptr) << info->pName;
-      } else if (f.dataType == SARN_DATA_TYPE_SUBDICT) {
-        EXPECT_NE(StructInfoForId(f.refIndex), nullptr) << info->pName;
-      } else if (f.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
-        EXPECT_EQ(f.arity, SARN_ARITY_REQUIRED);
-      }
-    }
-  }
+  EXPECT_EQ(std::vector<int>({enums, Schema::nEnumTypeG, Schema::nEnumDefG, withGaps}),
+            std::vector<int>({378, 378, 5801, 346}));
+  EXPECT_TRUE(Schema::vEnumDefG[668] != nullptr && Schema::vEnumDefG[5800] != nullptr);
   const StructInfo* success = Type("success");
   for (unsigned n = 0; n < success->nFieldInfo; ++n) EXPECT_NE(success->vFieldInfo[n].arity, SARN_ARITY_REQUIRED);
 }
 
-TEST(SchemaTables, OlderRecordsOfTheNamedFields) {
-  struct Case {
-    const char* type;
-    const char* field;
-    const char* current;
-    const char* older;
-  };
-  const Case kCases[] = {
-      {"endUserMessage", "endUserMessageId", "longId optional 22-42 flag", "longId required 7-21"},
-      {"audioStream", "audioStreamFormat", "enum optional 22-42 flag", "enum required 7-21"},
-      {"assetViewModify", "assetId", "longId required 13-42", "longId optional 7-12 flag"},
-      {"promotionalItem", "promotionalItemType", "enum multi 27-42", "enum required 7-26"},
-      {"localApplicationDataRemove", "key", "string multi 26-42", "string multi 7-25"},
-      {"gridRowSearch", "streamingPermission", "enum multi 17-42", "enum multi 14-16"},
-  };
-  auto text = [](const FieldInfo& f) {
-    std::string s = std::string(kDataTypeNames[f.dataType]) + " " + kArityNames[f.arity] + " " +
-                    std::to_string(f.minVersion) + "-" + std::to_string(f.maxVersion);
-    return f.flagOffset != 0 ? s + " flag" : s;
-  };
-  for (const Case& c : kCases) {
-    const StructInfo* info = Type(c.type);
-    ASSERT_NE(info, nullptr);
-    bool found = false;
-    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-      const FieldInfo& f = info->vFieldInfo[n];
-      if (f.arity == SARN_ARITY_NONE || std::strcmp(FieldName(info, f), c.field) != 0) continue;
-      found = true;
-      EXPECT_EQ(text(f), c.current) << c.type;
-      ASSERT_EQ(info->vFieldInfoHistory[n].nFieldInfo, 1u) << c.type;
-      const FieldInfo& older = info->vFieldInfoHistory[n].vFieldInfo[0];
-      EXPECT_EQ(text(older), c.older) << c.type;
-      EXPECT_NE(older.valueOffset, f.valueOffset) << "older representations keep their own slot";
-      EXPECT_EQ(older.nameOffset, f.nameOffset);
-    }
-    EXPECT_TRUE(found) << c.type << "." << c.field;
-  }
-}
-
-TEST(SchemaTables, RuleBPicksTheRecordOfTheVersion) {
+TEST(SchemaTables, FieldSelectionByVersion) {
+  // endUserMessageId: required up to 21 (the older record, no flag), optional from 22.
   const StructInfo* info = Type("endUserMessage");
-  ASSERT_NE(info, nullptr);
-  unsigned n = 0;
-  while (n < info->nFieldInfo && std::strcmp(FieldName(info, info->vFieldInfo[n]), "endUserMessageId") != 0) ++n;
+  unsigned n = FieldNumber(info, "endUserMessageId");
   ASSERT_LT(n, info->nFieldInfo);
   const FieldInfo* current = &info->vFieldInfo[n];
   const FieldInfo* older = &info->vFieldInfoHistory[n].vFieldInfo[0];
+  EXPECT_TRUE(older->flagOffset == 0 && current->flagOffset != 0);
+  // Version 0 never consults the history; the placeholder and numbers past the end give nothing.
+  const struct {
+    unsigned number;
+    KernoVersion version;
+    const FieldInfo* expected;
+  } kCases[] = {{n, 21, older}, {n, 7, older}, {n, 22, current}, {n, 0, current}, {n, 6, nullptr},
+                {n, 43, nullptr}, {0, 0, nullptr}, {info->nFieldInfo, 0, nullptr}};
+  for (const auto& c : kCases) EXPECT_EQ(FieldForVersion(info, c.number, c.version), c.expected) << c.version;
 
-  const FieldInfo* at21 = FieldForVersion(info, n, 21);
-  ASSERT_EQ(at21, older);
-  EXPECT_EQ(at21->arity, SARN_ARITY_REQUIRED);
-  EXPECT_EQ(at21->flagOffset, 0);
-  const FieldInfo* at22 = FieldForVersion(info, n, 22);
-  ASSERT_EQ(at22, current);
-  EXPECT_EQ(at22->arity, SARN_ARITY_OPTIONAL);
-  EXPECT_NE(at22->flagOffset, 0);
-  EXPECT_EQ(FieldForVersion(info, n, 0), current) << "version 0 never consults the history";
-  EXPECT_EQ(FieldForVersion(info, n, 7), older);
-  EXPECT_EQ(FieldForVersion(info, n, 6), nullptr);
-  EXPECT_EQ(FieldForVersion(info, n, 43), nullptr);
-  EXPECT_EQ(FieldForVersion(info, 0, 0), nullptr) << "placeholder";
-  EXPECT_EQ(FieldForVersion(info, info->nFieldInfo, 0), nullptr);
-
-  // Rule A: a field dropped after version 7 takes part at 7 and at 0 only.
+  // A field dropped after version 7 takes part at 7 and at 0 only.
   const StructInfo* ad = Type("ad");
   const FieldInfo& imageUrl = ad->vFieldInfo[6];
-  EXPECT_TRUE(FieldTakesPart(imageUrl, 0));
-  EXPECT_TRUE(FieldTakesPart(imageUrl, 7));
+  EXPECT_TRUE(FieldTakesPart(imageUrl, 0) && FieldTakesPart(imageUrl, 7));
   EXPECT_FALSE(FieldTakesPart(imageUrl, 8));
   EXPECT_FALSE(FieldTakesPart(ad->vFieldInfo[0], 0));
 }
 
 TEST(SchemaTables, LookupByNameWithinFiveProbes) {
   EXPECT_EQ(Schema::structNameHashTableSizeG, 3532);
-  int filled = 0;
+  int filled = 0, worst = 0;
   for (int slot = 0; slot < Schema::structNameHashTableSizeG; ++slot) filled += Schema::structNameHashTableG[slot] != nullptr;
   EXPECT_EQ(filled, 1272);
   EXPECT_EQ(StructInfoMap::HomeSlot("ad", 3532), 3107u);
-  int worst = 0;
   for (int id = 0; id < Schema::nStructDefG; ++id) {
     const StructInfo* info = Schema::vStructDefG[id];
     if (info == nullptr) continue;
     EXPECT_EQ(StructInfoMap::LookupStructByName(info->pName), info);
     uint32_t slot = StructInfoMap::HomeSlot(info->pName, Schema::structNameHashTableSizeG);
     int probes = 1;
-    while (Schema::structNameHashTableG[slot] != info) {
-      slot = (slot + 1) % Schema::structNameHashTableSizeG;
-      ++probes;
-    }
+    for (; Schema::structNameHashTableG[slot] != info; ++probes) slot = (slot + 1) % Schema::structNameHashTableSizeG;
     worst = std::max(worst, probes);
   }
   EXPECT_LE(worst, 5);
   EXPECT_EQ(StructInfoMap::LookupStructByName("address"), &sarnschema::Address::structInfoG);
-  EXPECT_EQ(StructInfoMap::LookupStructByName("Address"), nullptr);
-  EXPECT_EQ(StructInfoMap::LookupStructByName(""), nullptr);
+  for (const char* miss : {"Address", "", "addres", "addressX"}) EXPECT_EQ(StructInfoMap::LookupStructByName(miss), nullptr) << miss;
   EXPECT_EQ(StructInfoMap::LookupStructByName(nullptr), nullptr);
-  EXPECT_EQ(StructInfoMap::LookupStructByName("addres"), nullptr);
-  EXPECT_EQ(StructInfoMap::LookupStructByName("addressX"), nullptr);
 }

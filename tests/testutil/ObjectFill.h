@@ -21,9 +21,14 @@ inline uint32_t SomeEnumValue(unsigned enumId, unsigned start) {
   return 0;
 }
 
+template <typename T>
+void PutValue(sarn::SarnObject* object, const sarn::FieldInfo& field, T value) {
+  sarn::FieldAccess::PutScalar(object, field, &value);
+}
+
 // Sets every field that the current records describe (version 0), `nMulti` elements per array,
-// and nested objects down to `depth` more levels (required ones a little further) (KNOWN_DICT fields get a `success`). Strings hold
-// bytes that JSON must escape unless `fPlainText`.
+// and nested objects down to `depth` more levels (required ones a little further) (KNOWN_DICT
+// fields get a `success`). Strings hold bytes that JSON must escape unless `fPlainText`.
 inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed, int depth, unsigned nMulti = 2,
                        bool fPlainText = false) {
   using namespace sarn;
@@ -35,82 +40,34 @@ inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed
     for (unsigned e = 0; e < count; ++e) {
       unsigned s = seed * 31 + n * 7 + e;
       switch (field.dataType) {
-        case SARN_DATA_TYPE_BOOL: {
-          uint8_t v = s % 2;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_DATE: {
-          Date v;
-          v.daysM = 18000 + static_cast<int>(s % 1000);
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_TIME: {
-          Time v;
-          v.millisecondsM = static_cast<int>(s % 86400) * 1000;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_DATETIME: {
-          DateTime v;
-          v.millisecondsM = 1614863109000LL + static_cast<long long>(s) * 60000;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_ENUM: {
-          uint32_t v = SomeEnumValue(field.refIndex, s);
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
+        case SARN_DATA_TYPE_BOOL: PutValue(object, field, static_cast<uint8_t>(s % 2)); break;
+        case SARN_DATA_TYPE_DATE: PutValue(object, field, Date(18000 + static_cast<int>(s % 1000))); break;
+        case SARN_DATA_TYPE_TIME: PutValue(object, field, Time(static_cast<int>(s % 86400) * 1000)); break;
+        case SARN_DATA_TYPE_DATETIME: PutValue(object, field, DateTime(1614863109000LL + static_cast<long long>(s) * 60000)); break;
+        case SARN_DATA_TYPE_ENUM: PutValue(object, field, SomeEnumValue(field.refIndex, s)); break;
         case SARN_DATA_TYPE_INT_ID:
-        case SARN_DATA_TYPE_S32:
-        case SARN_DATA_TYPE_U32: {
-          uint32_t v = field.dataType == SARN_DATA_TYPE_S32 ? static_cast<uint32_t>(-static_cast<int>(s)) : 1000 + s;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_CHANNEL_NUMBER: {
-          ChannelNumber v(static_cast<int>(s % 999) + 1, s % 2 ? -2 : 1);
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_CURRENCY: {
-          Currency v(static_cast<int>(s), "USD");
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
-        case SARN_DATA_TYPE_FLOAT: {
-          double v = s + 0.25;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
+        case SARN_DATA_TYPE_U32: PutValue(object, field, 1000 + s); break;
+        case SARN_DATA_TYPE_S32: PutValue(object, field, static_cast<uint32_t>(-static_cast<int>(s))); break;
+        case SARN_DATA_TYPE_CHANNEL_NUMBER: PutValue(object, field, ChannelNumber(static_cast<int>(s % 999) + 1, s % 2 ? -2 : 1)); break;
+        case SARN_DATA_TYPE_CURRENCY: PutValue(object, field, Currency(static_cast<int>(s), "USD")); break;
+        case SARN_DATA_TYPE_FLOAT: PutValue(object, field, s + 0.25); break;
+        case SARN_DATA_TYPE_S64: PutValue(object, field, static_cast<uint64_t>(-1 - static_cast<long long>(s))); break;
         case SARN_DATA_TYPE_LONG_ID:
-        case SARN_DATA_TYPE_S64:
-        case SARN_DATA_TYPE_U64: {
-          uint64_t v = field.dataType == SARN_DATA_TYPE_S64 ? static_cast<uint64_t>(-1 - static_cast<long long>(s))
-                       : s % 3 == 0 ? (5ull << 48) + s * 1000003ull
-                                    : s * 1000003ull;
-          FieldAccess::PutScalar(object, field, &v);
-          break;
-        }
+        case SARN_DATA_TYPE_U64: PutValue(object, field, (s % 3 == 0 ? 5ull << 48 : 0) + s * 1000003ull); break;
         case SARN_DATA_TYPE_STRING:
         case SARN_DATA_TYPE_STRING_ID: {
           char text[64];
-          if (field.dataType == SARN_DATA_TYPE_STRING_ID) {
-            std::snprintf(text, sizeof text, "sid%u", s);
-          } else if (fPlainText) {
-            std::snprintf(text, sizeof text, "Some text of item %u", s);
-          } else {
-            std::snprintf(text, sizeof text, "Text %u \"q\" \\ \xC3\xA9\t/end", s);
-          }
+          std::snprintf(text, sizeof text,
+                        field.dataType == SARN_DATA_TYPE_STRING_ID ? "sid%u"
+                        : fPlainText                              ? "Some text of item %u"
+                                                                  : "Text %u \"q\" \\ \xC3\xA9\t/end",
+                        s);
           FieldAccess::PutString(object, field, VekString::FromUtf8Bytes(pool, std::strlen(text), text));
           break;
         }
         case SARN_DATA_TYPE_BYTESTRING: {
           unsigned char bytes[5] = {0, 1, static_cast<unsigned char>(s), 0xFE, 0xFF};
-          ref<vek::ByteBuffer> v = vek::ByteBuffer::New(pool, bytes, 1 + s % 5);
-          FieldAccess::PutReference(object, field, v.Get());
+          FieldAccess::PutReference(object, field, vek::ByteBuffer::New(pool, bytes, 1 + s % 5).Get());
           break;
         }
         case SARN_DATA_TYPE_ANY_DICT: {
@@ -120,25 +77,21 @@ inline void FillObject(VekMempool* pool, sarn::SarnObject* object, unsigned seed
           FieldAccess::PutReference(object, field, v.Get());
           break;
         }
-        case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
-          ref<LazyDict> v = LazyDict::FromJsonString(pool, "{\"type\": \"success\"}", 0);
-          FieldAccess::PutReference(object, field, v.Get());
+        case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY:
+          FieldAccess::PutReference(object, field, LazyDict::FromJsonString(pool, "{\"type\": \"success\"}", 0).Get());
           break;
-        }
         case SARN_DATA_TYPE_KNOWN_DICT:
         case SARN_DATA_TYPE_SUBDICT: {
           // Past the depth only required objects are made (readers insist on them), up to a bound.
           if (depth <= 0 && (field.arity != SARN_ARITY_REQUIRED || depth < -8)) break;
-          unsigned typeId = field.dataType == SARN_DATA_TYPE_SUBDICT ? field.refIndex : 543;  // success
-          const StructInfo* target = StructInfoForId(typeId);
+          const StructInfo* target = StructInfoForId(field.dataType == SARN_DATA_TYPE_SUBDICT ? field.refIndex : 543);
           if (target == nullptr) break;
           ref<SarnObject> v = target->pFactory(pool);
           FillObject(pool, v.Get(), s, depth - 1, nMulti, fPlainText);
           FieldAccess::PutReference(object, field, v.Get());
           break;
         }
-        default:
-          break;
+        default: break;
       }
     }
     MarkFieldPresent(object, field);

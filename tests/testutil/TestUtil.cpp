@@ -1,5 +1,6 @@
 #include "testutil/TestUtil.h"
 
+#include <pthread.h>
 #include <sys/stat.h>
 
 #include <cstdio>
@@ -20,6 +21,23 @@ std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
   std::vector<std::string_view> chunks;
   for (size_t at = 0; at < input.size(); at += size) chunks.push_back(input.substr(at, size));
   return chunks;
+}
+
+void RunOnStack(size_t bytes, const std::function<void()>& work) {
+#if defined(__SANITIZE_ADDRESS__) || !defined(__OPTIMIZE__)
+  bytes *= 8;
+#endif
+  pthread_attr_t attributes;
+  pthread_attr_init(&attributes);
+  pthread_attr_setstacksize(&attributes, bytes);
+  pthread_t thread;
+  auto call = [](void* argument) -> void* {
+    (*static_cast<const std::function<void()>*>(argument))();
+    return nullptr;
+  };
+  ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
+  pthread_join(thread, nullptr);
+  pthread_attr_destroy(&attributes);
 }
 
 std::string CorpusDir(const std::string& name) {

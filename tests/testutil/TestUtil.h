@@ -12,6 +12,12 @@
 
 namespace sarntest {
 
+// The bytes of a string or a byte string, NUL bytes included.
+inline std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
+  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
+}
+
 // The ways an incremental reader is fed one input: whole, one byte at a time, and split in
 // two at every position. Each call of `feed` receives one complete feeding as a list of
 // chunks and a label describing it (for failure messages).
@@ -29,6 +35,11 @@ class PoolTest : public ::testing::Test {
   void TearDown() override { EXPECT_EQ(poolM.GetUsedBytes(), 0u) << "bytes left in the test pool"; }
   VekMempool poolM;
 };
+
+// Runs `work` on a thread with a native stack of `bytes` (256 KiB is what the depth limits
+// promise a whole read, write, compare and release fits in). Sanitizers and unoptimised builds
+// multiply frame sizes, so they get eight times the room; the promise is about release builds.
+void RunOnStack(size_t bytes, const std::function<void()>& work);
 
 // A folder of the shared public corpora, or "" when it is absent (tests then skip).
 std::string CorpusDir(const std::string& name);

@@ -49,7 +49,10 @@ class SARN_EXPORT ProtoBuf {
  public:
   ProtoBuf(VekMempool* pool, const StructInfo* const* structDefs, int count, const Limits& limits = Limits());
 
-  // ---- Writing (cannot fail) -----------------------------------------------------------------
+  // ---- Writing --------------------------------------------------------------------------------
+  // Nested objects are walked with an explicit stack, so any depth is written. Writing fails only
+  // for lack of memory, and then as the stream's own growth does: `out` turns out of memory and
+  // Finish gives no bytes.
   // The object's fields: no tag, no length (the top-level form of an object of a known type).
   void Marshal(const SarnObject* object, ProtoBufByteOutputStream* out) const;
   void MarshalDict(const SarnObject* object, ProtoBufByteOutputStream* out) const;
@@ -121,7 +124,8 @@ class SARN_EXPORT ProtoBuf {
   // An envelope's body range read as a known-dict value; an `error` object with `failure` when it
   // does not read (or is missing).
   ref<SarnObject> ReadBody(const unsigned char* begin, const unsigned char* end, const char* failure) const;
-  void WriteValue(const FieldInfo* field, const SarnObject* object, unsigned i, ProtoBufByteOutputStream* out) const;
+  // The binary side of the shared object walk (model/internal/ObjectWalk.h).
+  class Writer;
   bool ReadValue(const FieldInfo* field, const unsigned char** cursor, const unsigned char* end,
                  SarnObject* object) const;
 

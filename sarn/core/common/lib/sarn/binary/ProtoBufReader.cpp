@@ -312,6 +312,8 @@ bool ProtoBuf::UnmarshalKnownDictAsLazyField(Cursor cursor, End end, ref<LazyDic
   ref<vek::ByteBuffer> bytes = vek::ByteBuffer::New(pMempoolM, p, partEnd - p);
   if (!bytes) return false;
   *result = LazyDict::FromBytestring(pMempoolM, bytes, 0);
+  // Empty bytes (or a leading NUL) are no payload; any other null is a payload not made.
+  if (!*result && p != partEnd && *p != 0) return false;
   *cursor = partEnd;
   return true;
 }
@@ -351,7 +353,7 @@ bool ProtoBuf::UnmarshalAnyDictValue(const unsigned char* begin, End end, dictva
     }
     if (tag != kTagEntry) return false;
     if (!nested) {
-      nested = new (pMempoolM) Dict();
+      nested = MakeDict(pMempoolM);
       if (!nested) return false;
     }
     // Each dictionary opens a level, as a JSON object does.
@@ -360,7 +362,7 @@ bool ProtoBuf::UnmarshalAnyDictValue(const unsigned char* begin, End end, dictva
     p = partEnd;
   }
   if (!nested) {
-    nested = new (pMempoolM) Dict();  // an empty value section is an empty dictionary
+    nested = MakeDict(pMempoolM);  // an empty value section is an empty dictionary
     if (!nested) return false;
   }
   kind = dictvalue::TYPE_DICT;
@@ -391,11 +393,8 @@ bool ProtoBuf::UnmarshalAnyDictField(const unsigned char* begin, End end, const 
       VekString text;
       ref<Dict> value;
       if (!UnmarshalAnyDictValue(p, partEnd, kind, text, value)) return false;
-      if (kind == dictvalue::TYPE_STRING) {
-        dict->AddString(name, text);
-      } else {
-        dict->AddDict(name, value);
-      }
+      bool isAdded = kind == dictvalue::TYPE_STRING ? dict->AddString(name, text) : dict->AddDict(name, value);
+      if (!isAdded) return false;
     } else if (tag != kTagName) {
       return false;
     }

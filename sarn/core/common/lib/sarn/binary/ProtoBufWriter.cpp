@@ -1,11 +1,14 @@
-// The writing half of ProtoBuf: tags from record indexes, values by data type, nested objects and
-// dictionaries in sections of the output stream, whose lengths Finish fills in.
+// The writing half of ProtoBuf: the binary side of the shared object walk. Tags come from record
+// indexes and the wire types of the data-type traits, values are written by data type, and nested
+// objects and dictionaries go into sections of the output stream, whose lengths Finish fills in.
+// A nested object's sections are opened when its value is met and closed when the walk leaves it.
 #include <cstdint>
 #include <cstring>
 
 #include "sarn/binary/GoogleInt.h"
 #include "sarn/binary/ProtoBuf.h"
 #include "sarn/model/FieldAccess.h"
+#include "sarn/model/internal/ObjectWalk.h"
 #include "sarn/values/ScalarTypes.h"
 
 namespace sarn {
@@ -14,143 +17,213 @@ namespace {
 
 using Out = ProtoBufByteOutputStream;
 
-// Wire type by data type code: 0 varint, 1 eight bytes, 2 length-delimited.
-constexpr unsigned char kWireType[21] = {0, 2, 2, 2, 0, 0, 2, 0, 1, 0, 0, 2, 2, 2, 2, 0, 0, 2, 0, 0, 0};
+// Per object: the sections its value opened, to be closed after its fields, and the tag its
+// field's values are written with (a one-field walk may be given one, or none).
+struct ProtoBufFrameData {
+  int64_t tagM;
+  unsigned nSectionsM;
+};
 
-unsigned WireTypeOf(unsigned dataType) { return dataType < sizeof kWireType ? kWireType[dataType] : 0; }
+constexpr int64_t kTagOfRecord = -1; // the tag follows from the field number and the wire type
+constexpr int64_t kNoTag = -2;       // the value alone
 
-bool IsReference(unsigned dataType) {
-  return FieldAccess::StorageOf(dataType) == FieldAccess::STORAGE_REFERENCE;
+ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, n}; }
+
+// The tag and sections of a known dict: the type id (0 for no object) as a known-dict tag, then
+// the fields in a section.
+void OpenKnownDictValue(const SarnObject* object, Out* out) {
+  GoogleInt::WriteGoogleU32((object != nullptr ? object->GetTypeId() : 0) * 8 + 2, out);
+  out->StartSection();
 }
 
-void WriteText(const VekString& text, Out* out) { out->WriteString(text); }
-
 }  // namespace
+
+class ProtoBuf::Writer {
+ public:
+  using FrameData = ProtoBufFrameData;
+  using Walk = internal::ObjectWalk<Writer>;
+  using Frame = Walk::Frame;
+  using Child = Walk::Child;
+
+  Writer(const ProtoBuf& codec, Out* out)
+      : codecM(codec),
+        outM(out),
+        walkM(codec.pMempoolM, codec.structDefsM, static_cast<uint32_t>(codec.structDefCountM),
+              internal::WalkVersions::CURRENT_RECORDS) {}
+
+  // Walks `object` (fields of `info`) and closes the sections in `data` after it.
+  void Run(const SarnObject* object, const StructInfo* info, const FrameData& data) {
+    if (!walkM.Run(*this, object, info, 0, data)) Fail();
+  }
+  void Run(const SarnObject* object, const FrameData& data) { Run(object, walkM.InfoOf(object), data); }
+  void RunField(const FieldInfo& field, const SarnObject* object, int64_t tag) {
+    FrameData data{tag, 0};
+    if (!walkM.RunField(*this, object, field, nullptr, 0, data)) Fail();
+  }
+
+  void BeginObject(Frame&, Frame*) {}
+  void BeginField(Frame&) {}
+  void EndField(Frame&) {}
+  void EndObject(Frame& frame) {
+    for (unsigned k = 0; k < frame.dataM.nSectionsM; ++k) outM->EndSection();
+  }
+
+  bool Value(Frame& frame, unsigned i, Child& child) {
+    const FieldInfo& field = *frame.pFieldM;
+    const SarnObject* object = frame.pObjectM;
+    // A null byte string is left out even when REQUIRED: an empty value would not read back as null.
+    if (field.dataType == SARN_DATA_TYPE_BYTESTRING && FieldAccess::ReferenceAt(object, field, i) == nullptr) {
+      return true;
+    }
+    int64_t tag = frame.dataM.tagM;
+    if (tag == kTagOfRecord) tag = static_cast<int64_t>(frame.nFieldM) * 8 + TraitsOf(field.dataType).wireType;
+    if (tag != kNoTag) GoogleInt::WriteGoogleU32(static_cast<unsigned int>(tag), outM);
+    switch (field.dataType) {
+      case SARN_DATA_TYPE_BOOL:
+        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0 ? 1 : 0, outM);
+        return true;
+      case SARN_DATA_TYPE_DATE:
+      case SARN_DATA_TYPE_S32:
+        GoogleInt::WriteGoogleS32(FieldAccess::ScalarValue<int32_t>(object, field, i), outM);
+        return true;
+      case SARN_DATA_TYPE_DATETIME:
+      case SARN_DATA_TYPE_S64:
+        GoogleInt::WriteGoogleS64(FieldAccess::ScalarValue<int64_t>(object, field, i), outM);
+        return true;
+      case SARN_DATA_TYPE_ENUM:
+      case SARN_DATA_TYPE_TIME:
+      case SARN_DATA_TYPE_INT_ID:
+      case SARN_DATA_TYPE_U32:
+        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint32_t>(object, field, i), outM);
+        return true;
+      case SARN_DATA_TYPE_LONG_ID:
+      case SARN_DATA_TYPE_U64:
+        GoogleInt::WriteGoogleU64(FieldAccess::ScalarValue<uint64_t>(object, field, i), outM);
+        return true;
+      case SARN_DATA_TYPE_FLOAT: {
+        uint64_t bits = FieldAccess::ScalarValue<uint64_t>(object, field, i);
+        for (int k = 0; k < 8; ++k, bits >>= 8) outM->WriteByte(static_cast<unsigned char>(bits));
+        return true;
+      }
+      case SARN_DATA_TYPE_CHANNEL_NUMBER:
+        outM->WriteString(FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
+        return true;
+      case SARN_DATA_TYPE_CURRENCY:
+        outM->WriteString(FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
+        return true;
+      case SARN_DATA_TYPE_STRING:
+      case SARN_DATA_TYPE_STRING_ID:
+        outM->WriteString(FieldAccess::StringAt(object, field, i));
+        return true;
+      default:
+        break;
+    }
+    VekCore* value = FieldAccess::ReferenceAt(object, field, i);
+    switch (field.dataType) {
+      case SARN_DATA_TYPE_BYTESTRING: {
+        const vek::ByteBuffer* bytes = static_cast<const vek::ByteBuffer*>(value);
+        outM->StartSection();
+        outM->WriteBytes(bytes->GetData(), bytes->GetLength());
+        outM->EndSection();
+        return true;
+      }
+      case SARN_DATA_TYPE_ANY_DICT:
+        codecM.MarshalAnyDictWithLength(static_cast<Dict*>(value), outM);
+        return true;
+      case SARN_DATA_TYPE_SUBDICT:
+        outM->StartSection();
+        Descend(child, static_cast<const SarnObject*>(value), 1);
+        return true;
+      case SARN_DATA_TYPE_KNOWN_DICT:
+        outM->StartSection();
+        OpenKnownDictValue(static_cast<const SarnObject*>(value), outM);
+        Descend(child, static_cast<const SarnObject*>(value), 2);
+        return true;
+      case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
+        // A payload that cannot be converted gives an error object, which is then what is written.
+        ref<SarnObject> inner = static_cast<const LazyDict*>(value)->ToSarnObjectOrError();
+        outM->StartSection();
+        OpenKnownDictValue(inner.Get(), outM);
+        if (inner == nullptr) {
+          outM->EndSection();
+          outM->EndSection();
+          return true;
+        }
+        inner->UpRef();
+        Descend(child, inner.Get(), 2);
+        child.isOwnedM = true;
+        return true;
+      }
+      default:
+        return true;
+    }
+  }
+
+ private:
+  static void Descend(Child& child, const SarnObject* object, unsigned nSections) {
+    child.pObjectM = object;
+    child.dataM = Sections(nSections);
+  }
+  // The stack could not grow: the stream's own out-of-memory state, so that Finish gives nothing.
+  void Fail() { outM->bytesM.isOutOfMemoryM = true; }
+
+  const ProtoBuf& codecM;
+  Out* outM;
+  Walk walkM;
+};
 
 void ProtoBuf::Marshal(const SarnObject* object, Out* out) const { MarshalDict(object, out); }
 
 void ProtoBuf::MarshalDict(const SarnObject* object, Out* out) const {
-  const StructInfo* info = object != nullptr && object->GetTypeId() < static_cast<uint32_t>(structDefCountM)
-                               ? structDefsM[object->GetTypeId()]
-                               : nullptr;
-  if (info != nullptr) MarshalFields(info, object, out);
+  Writer writer(*this, out);
+  writer.Run(object, Sections(0));
 }
 
 void ProtoBuf::MarshalFields(const StructInfo* info, const SarnObject* object, Out* out) const {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const FieldInfo* field = &info->vFieldInfo[n];
-    if (field->arity == SARN_ARITY_NONE || field->dataType > SARN_DATA_TYPE_U64) continue;
-    unsigned int tag = n * 8 + WireTypeOf(field->dataType);
-    if (field->arity == SARN_ARITY_MULTI) {
-      MarshalMultiField(static_cast<int>(tag), field, object, out);
-      continue;
-    }
-    if (!IsFieldPresent(object, *field)) continue;
-    // A null reference is skipped even when the field is REQUIRED: an empty value would not read
-    // back as null.
-    if (IsReference(field->dataType) && FieldAccess::ReferenceAt(object, *field, 0) == nullptr) continue;
-    GoogleInt::WriteGoogleU32(tag, out);
-    MarshalSingleField(field, object, out);
-  }
+  Writer writer(*this, out);
+  writer.Run(object, info, Sections(0));
 }
 
 void ProtoBuf::MarshalMultiField(int tag, const FieldInfo* field, const SarnObject* object, Out* out) const {
-  unsigned count = FieldAccess::Count(object, *field);
-  for (unsigned i = 0; i < count; ++i) {
-    if (IsReference(field->dataType) && FieldAccess::ReferenceAt(object, *field, i) == nullptr) continue;
-    GoogleInt::WriteGoogleU32(static_cast<unsigned int>(tag), out);
-    WriteValue(field, object, i, out);
-  }
+  Writer writer(*this, out);
+  writer.RunField(*field, object, static_cast<unsigned int>(tag));
 }
 
 void ProtoBuf::MarshalSingleField(const FieldInfo* field, const SarnObject* object, Out* out) const {
-  WriteValue(field, object, 0, out);
-}
-
-void ProtoBuf::WriteValue(const FieldInfo* field, const SarnObject* object, unsigned i, Out* out) const {
-  switch (field->dataType) {
-    case SARN_DATA_TYPE_BOOL:
-      GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint8_t>(object, *field, i) != 0 ? 1 : 0, out);
-      return;
-    case SARN_DATA_TYPE_DATE:
-    case SARN_DATA_TYPE_S32:
-      GoogleInt::WriteGoogleS32(FieldAccess::ScalarValue<int32_t>(object, *field, i), out);
-      return;
-    case SARN_DATA_TYPE_DATETIME:
-    case SARN_DATA_TYPE_S64:
-      GoogleInt::WriteGoogleS64(FieldAccess::ScalarValue<int64_t>(object, *field, i), out);
-      return;
-    case SARN_DATA_TYPE_ENUM:
-    case SARN_DATA_TYPE_TIME:
-    case SARN_DATA_TYPE_INT_ID:
-    case SARN_DATA_TYPE_U32:
-      GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint32_t>(object, *field, i), out);
-      return;
-    case SARN_DATA_TYPE_LONG_ID:
-    case SARN_DATA_TYPE_U64:
-      GoogleInt::WriteGoogleU64(FieldAccess::ScalarValue<uint64_t>(object, *field, i), out);
-      return;
-    case SARN_DATA_TYPE_FLOAT: {
-      uint64_t bits = FieldAccess::ScalarValue<uint64_t>(object, *field, i);
-      for (int k = 0; k < 8; ++k, bits >>= 8) out->WriteByte(static_cast<unsigned char>(bits));
-      return;
-    }
-    case SARN_DATA_TYPE_CHANNEL_NUMBER:
-      WriteText(FieldAccess::ScalarValue<ChannelNumber>(object, *field, i).ToString(), out);
-      return;
-    case SARN_DATA_TYPE_CURRENCY:
-      WriteText(FieldAccess::ScalarValue<Currency>(object, *field, i).ToString(), out);
-      return;
-    case SARN_DATA_TYPE_STRING:
-    case SARN_DATA_TYPE_STRING_ID:
-      WriteText(FieldAccess::StringAt(object, *field, i), out);
-      return;
-    default:
-      break;
-  }
-  VekCore* value = FieldAccess::ReferenceAt(object, *field, i);
-  switch (field->dataType) {
-    case SARN_DATA_TYPE_BYTESTRING: {
-      const vek::ByteBuffer* bytes = static_cast<const vek::ByteBuffer*>(value);
+  // The caller has written the tag, so a null reference still needs a value: an empty one.
+  if (FieldAccess::StorageOf(field->dataType) == FieldAccess::STORAGE_REFERENCE &&
+      FieldAccess::ReferenceAt(object, *field, 0) == nullptr) {
+    if (TraitsOf(field->dataType).fHoldsObjects && field->dataType != SARN_DATA_TYPE_SUBDICT) {
+      MarshalKnownDictField(nullptr, out);
+    } else {
       out->StartSection();
-      if (bytes != nullptr) out->WriteBytes(bytes->GetData(), bytes->GetLength());
       out->EndSection();
-      return;
     }
-    case SARN_DATA_TYPE_ANY_DICT:
-      MarshalAnyDictWithLength(static_cast<Dict*>(value), out);
-      return;
-    case SARN_DATA_TYPE_KNOWN_DICT:
-      MarshalKnownDictField(static_cast<const SarnObject*>(value), out);
-      return;
-    case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY:
-      MarshalKnownDictAsLazyField(static_cast<const LazyDict*>(value), out);
-      return;
-    case SARN_DATA_TYPE_SUBDICT:
-      MarshalSubdict(static_cast<const SarnObject*>(value), out);
-      return;
-    default:
-      return;
+    return;
   }
+  Writer writer(*this, out);
+  writer.RunField(*field, object, kNoTag);
 }
 
 void ProtoBuf::MarshalSubdict(const SarnObject* object, Out* out) const {
   out->StartSection();
-  MarshalDict(object, out);
-  out->EndSection();
+  Writer writer(*this, out);
+  writer.Run(object, Sections(1));
 }
 
 void ProtoBuf::MarshalKnownDictValue(const SarnObject* object, Out* out) const {
-  GoogleInt::WriteGoogleU32((object != nullptr ? object->GetTypeId() : 0) * 8 + 2, out);
-  MarshalSubdict(object, out);
+  OpenKnownDictValue(object, out);
+  Writer writer(*this, out);
+  writer.Run(object, Sections(1));
 }
 
 void ProtoBuf::MarshalKnownDict(const SarnObject* object, Out* out) const { MarshalKnownDictValue(object, out); }
 
 void ProtoBuf::MarshalKnownDictField(const SarnObject* object, Out* out) const {
   out->StartSection();
-  MarshalKnownDictValue(object, out);
-  out->EndSection();
+  OpenKnownDictValue(object, out);
+  Writer writer(*this, out);
+  writer.Run(object, Sections(2));
 }
 
 void ProtoBuf::MarshalKnownDictAsLazyField(const LazyDict* payload, Out* out) const {

@@ -8,18 +8,23 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+
 namespace {
 
 // The Add overloads of the two containers for each type the facade stores.
-inline void AddTo(Dictionary& dictionary, const VekString& name, const VekString& value) {
-  dictionary.Add(name, value);
+inline bool AddTo(Dictionary& dictionary, const VekString& name, const VekString& value) {
+  return dictionary.Add(name, value);
 }
-inline void AddTo(Dictionary& dictionary, const VekString& name, const ref<Dictionary>& value) {
-  dictionary.Add(name, value);
+inline bool AddTo(Dictionary& dictionary, const VekString& name, const ref<Dictionary>& value) {
+  return dictionary.Add(name, value);
 }
-inline void AddTo(Dictionary& dictionary, const VekString& name, const ref<LazyDict>& value) {
-  dictionary.Add(name, value);
+inline bool AddTo(Dictionary& dictionary, const VekString& name, const ref<LazyDict>& value) {
+  return dictionary.Add(name, value);
 }
+inline bool AddTo(ArrayValue& array, const VekString& value) { return array.Add(value); }
+template <class T>
+inline bool AddTo(ArrayValue& array, const ref<T>& value) { return array.Add(value); }
 
 }  // namespace
 
@@ -29,48 +34,46 @@ Dict::Dict(const ref<Dictionary>& dictionary) : dictionaryM(dictionary) {}
 
 Dict::~Dict() { TreeRelease::Release(dictionaryM); }
 
-ref<Dict> MakeDict(VekMempool* pool) { return ref<Dict>(new (pool) Dict()); }
+ref<Dict> MakeDict(VekMempool* pool) {
+  ref<Dict> dict = new (pool) Dict();
+  return dict && dict->dictionaryM ? dict : ref<Dict>();
+}
 
 ref<Dict> Dict::New(VekMempool* pool, const VekString& typeName) {
   ref<Dict> dict = MakeDict(pool);
-  if (!typeName.FEmpty()) dict->AddString(VekString("type"), typeName);
+  if (dict && !typeName.FEmpty() && !dict->AddString(VekString("type"), typeName)) return ref<Dict>();
   return dict;
 }
 
 template <class T>
-void Dict::AddToDictOrArray(const VekString& name, const T& value) {
+bool Dict::AddToDictOrArray(const VekString& name, const T& value) {
+  if (!dictionaryM) return false;
   ref<DictValue> first = dictionaryM->Get(name);
-  if (!first) {
-    AddTo(*dictionaryM, name, value);
-    return;
-  }
-  if (first->kindM == DictValue::KIND_ARRAY) {
-    static_cast<ArrayValue*>(first.Get())->Add(value);
-    return;
-  }
-  dictionaryM->Remove(name);
+  if (!first) return AddTo(*dictionaryM, name, value);
+  if (first->kindM == DictValue::KIND_ARRAY) return AddTo(*static_cast<ArrayValue*>(first.Get()), value);
+  // The array is complete before it replaces the value, so a failure changes nothing.
   ref<ArrayValue> array = new (pMempoolM) ArrayValue();
-  dictionaryM->Add(name, array);
-  array->Add(first);
-  array->Add(value);
+  if (!array || !array->Add(first) || !AddTo(*array, value)) return false;
+  dictionaryM->Remove(name);
+  return dictionaryM->Add(name, array);
 }
 
-template SARN_EXPORT void Dict::AddToDictOrArray<VekString>(const VekString&, const VekString&);
-template SARN_EXPORT void Dict::AddToDictOrArray<ref<Dictionary>>(const VekString&, const ref<Dictionary>&);
-template SARN_EXPORT void Dict::AddToDictOrArray<ref<LazyDict>>(const VekString&, const ref<LazyDict>&);
+template SARN_EXPORT bool Dict::AddToDictOrArray<VekString>(const VekString&, const VekString&);
+template SARN_EXPORT bool Dict::AddToDictOrArray<ref<Dictionary>>(const VekString&, const ref<Dictionary>&);
+template SARN_EXPORT bool Dict::AddToDictOrArray<ref<LazyDict>>(const VekString&, const ref<LazyDict>&);
 
-void Dict::AddString(const VekString& name, const VekString& value) { AddToDictOrArray(name, value); }
-void Dict::AddString(const char* name, const char* value) { AddString(VekString(name), VekString(value)); }
+bool Dict::AddString(const VekString& name, const VekString& value) { return AddToDictOrArray(name, value); }
+bool Dict::AddString(const char* name, const char* value) { return AddString(VekString(name), VekString(value)); }
 
-void Dict::AddDict(const VekString& name, const ref<Dict>& value) {
-  if (value) AddToDictOrArray(name, value->dictionaryM);
+bool Dict::AddDict(const VekString& name, const ref<Dict>& value) {
+  return !value || AddToDictOrArray(name, value->dictionaryM);
 }
-void Dict::AddDict(const char* name, const ref<Dict>& value) { AddDict(VekString(name), value); }
+bool Dict::AddDict(const char* name, const ref<Dict>& value) { return AddDict(VekString(name), value); }
 
-void Dict::AddLazyDict(const VekString& name, const ref<LazyDict>& value) {
-  if (value) AddToDictOrArray(name, value);
+bool Dict::AddLazyDict(const VekString& name, const ref<LazyDict>& value) {
+  return !value || AddToDictOrArray(name, value);
 }
-void Dict::AddLazyDict(const char* name, const ref<LazyDict>& value) { AddLazyDict(VekString(name), value); }
+bool Dict::AddLazyDict(const char* name, const ref<LazyDict>& value) { return AddLazyDict(VekString(name), value); }
 
 void Dict::InsertTypeZero(const VekString& typeName) { AddString(VekString("type"), typeName); }
 

@@ -80,23 +80,24 @@ class SARN_EXPORT Dict : public VekCore {
   ~Dict() override;
   Dict(const Dict&) = delete;
   Dict& operator=(const Dict&) = delete;
-  // MakeDict, then "type" = typeName when it is not empty.
+  // MakeDict, then "type" = typeName when it is not empty. Null when memory runs out.
   static ref<Dict> New(VekMempool* pool, const VekString& typeName);
   ref<Dictionary> GetDictionary() const { return dictionaryM; }
 
-  void AddString(const VekString& name, const VekString& value);
-  void AddString(const char* name, const char* value);
-  // Adds the Dict's Dictionary (shared); nothing when `value` is null.
-  void AddDict(const VekString& name, const ref<Dict>& value);
-  void AddDict(const char* name, const ref<Dict>& value);
-  // Adds a LazyDictValue around the payload; nothing when `value` is null.
-  void AddLazyDict(const VekString& name, const ref<LazyDict>& value);
-  void AddLazyDict(const char* name, const ref<LazyDict>& value);
+  // The adds return false, changing nothing, when memory runs out (or an array is full).
+  bool AddString(const VekString& name, const VekString& value);
+  bool AddString(const char* name, const char* value);
+  // Adds the Dict's Dictionary (shared); nothing (and true) when `value` is null.
+  bool AddDict(const VekString& name, const ref<Dict>& value);
+  bool AddDict(const char* name, const ref<Dict>& value);
+  // Adds a LazyDictValue around the payload; nothing (and true) when `value` is null.
+  bool AddLazyDict(const VekString& name, const ref<LazyDict>& value);
+  bool AddLazyDict(const char* name, const ref<LazyDict>& value);
   void InsertTypeZero(const VekString& typeName);
   // Adds `value`, or appends it to the array under `name` (which it creates from the value
   // already there). Instantiated for VekString, ref<Dictionary> and ref<LazyDict>.
   template <class T>
-  void AddToDictOrArray(const VekString& name, const T& value);
+  bool AddToDictOrArray(const VekString& name, const T& value);
 
   // A negative index arrives as a huge unsigned one and finds nothing.
   ref<DictValue> FindValue(const VekString& name, unsigned long index) const;
@@ -142,7 +143,7 @@ class SARN_EXPORT Dict : public VekCore {
   ref<Dictionary> dictionaryM;
 };
 
-// A new empty Dict in `pool`.
+// A new empty Dict in `pool`; null when memory runs out.
 SARN_EXPORT ref<Dict> MakeDict(VekMempool* pool);
 
 }  // namespace sarn

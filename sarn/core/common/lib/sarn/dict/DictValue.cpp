@@ -18,6 +18,9 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+using internal::TreeWalk;
+
 namespace {
 
 const char kSpacesG[] = "                                                                ";  // 64
@@ -118,21 +121,23 @@ class TreeWriter {
   template <class Out>
   static void Object(const Dictionary& dictionary, Out& out, JsonFormat format) {
     // The sorted order lives on the stack for the small objects that dominate; a larger one
-    // borrows a block of the dictionary's pool for the duration of the write.
+    // borrows a block of the dictionary's pool for the duration of the write. Without that
+    // block the names are picked one at a time instead: the same bytes, in quadratic time.
     Dictionary::SortKey local[16];
     Dictionary::SortKey* order = local;
     if (dictionary.nNameM > 16) {
       order = static_cast<Dictionary::SortKey*>(
           dictionary.GetMempool()->Malloc(sizeof(Dictionary::SortKey) * dictionary.nNameM));
-      if (order == nullptr) return;
     }
-    dictionary.SortedFirsts(order);
+    if (order != nullptr) dictionary.SortedFirsts(order);
     out.Put('{');
     ++format.depthM;
+    int32_t first = -1;
     for (uint32_t k = 0; k < dictionary.nNameM; ++k) {
       if (k > 0) out.Put(", ", 2);
-      for (int32_t i = order[k].entryM; i >= 0; i = dictionary.vEntryM[i].nextM) {
-        if (i != order[k].entryM) out.Put(", ", 2);
+      first = order != nullptr ? order[k].entryM : NextFirstByName(dictionary, first);
+      for (int32_t i = first; i >= 0; i = dictionary.vEntryM[i].nextM) {
+        if (i != first) out.Put(", ", 2);
         NewLine(out, format);
         Indent(out, format);
         out.Text(dictionary.vEntryM[i].nameM, false);
@@ -145,6 +150,25 @@ class TreeWriter {
     Indent(out, format);
     out.Put('}');
     if (order != local) dictionary.GetMempool()->Free(order);
+  }
+
+ private:
+  // The first entry of the least name above the name of entry `previous` (-1: the least name).
+  static int32_t NextFirstByName(const Dictionary& dictionary, int32_t previous) {
+    int32_t best = -1;
+    for (uint32_t i = 0; i < dictionary.nEntryM; ++i) {
+      if (dictionary.vEntryM[i].lastOrOrdinalM < 0) continue;
+      const VekString& name = dictionary.vEntryM[i].nameM;
+      if (previous >= 0 && !NameLess(dictionary.vEntryM[previous].nameM, name)) continue;
+      if (best < 0 || NameLess(name, dictionary.vEntryM[best].nameM)) best = static_cast<int32_t>(i);
+    }
+    return best;
+  }
+  // Byte order, a shorter name before the longer one it starts (SortedFirsts' order).
+  static bool NameLess(const VekString& x, const VekString& y) {
+    size_t nx = x.NByte(), ny = y.NByte();
+    int c = std::memcmp(x.Utf8(), y.Utf8(), nx < ny ? nx : ny);
+    return c != 0 ? c < 0 : nx < ny;
   }
 };
 
@@ -254,6 +278,7 @@ void JsonFormat::Indent(wynbaselib::Bytesink& out) const {
 VekString DictValue::ToJson(bool pretty) const {
   ByteBuffer text(pMempoolM);
   ToJson(text, JsonFormat(pretty));
+  // A failed buffer is empty, so the result is too: no value's JSON is empty.
   return VekString::FromUtf8Bytes(pMempoolM, text.GetLength(), text.GetData());
 }
 
@@ -313,22 +338,25 @@ bool StringValue::GetValue(unsigned int& out) const {
 
 bool StringValue::GetValue(ref<vek::ByteBuffer>& out) const {
   out = DecodeBase64(pMempoolM, valueM);
-  return true;
+  return out != nullptr;
 }
 
 namespace {
-ref<StringValue> MakeText(VekString&& text, bool needQuotes, VekMempool* pool) {
+// `isEmptyAllowed` is false where only a failed allocation leaves the text empty.
+ref<StringValue> MakeText(VekString&& text, bool needQuotes, VekMempool* pool, bool isEmptyAllowed = false) {
+  if (text.FEmpty() && !isEmptyAllowed) return ref<StringValue>();
   ref<StringValue> value = new (pool) StringValue(static_cast<VekString&&>(text));
-  value->needQuotesM = needQuotes;
+  if (value) value->needQuotesM = needQuotes;
   return value;
 }
 }  // namespace
 
 ref<StringValue> StringValue::Make(const char* text, VekMempool* pool) {
-  return MakeText(VekString::FromUtf8Bytes(pool, text != nullptr ? std::strlen(text) : 0, text), true, pool);
+  size_t n = text != nullptr ? std::strlen(text) : 0;
+  return MakeText(VekString::FromUtf8Bytes(pool, n, text), true, pool, n == 0);
 }
 ref<StringValue> StringValue::Make(const ref<vek::ByteBuffer>& bytes, VekMempool* pool) {
-  return MakeText(EncodeBase64(pool, bytes), true, pool);
+  return MakeText(EncodeBase64(pool, bytes), true, pool, !bytes || bytes->GetLength() == 0);
 }
 ref<StringValue> StringValue::Make(bool value, VekMempool* pool) {
   return MakeText(Dict::FormatBool(pool, value), false, pool);

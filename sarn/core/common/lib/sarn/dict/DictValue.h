@@ -29,7 +29,9 @@ class ByteBuffer;
 class Dictionary;
 class LazyDict;
 struct InputPointer;
+namespace internal {
 class TreeRelease;
+}  // namespace internal
 
 // How a tree is written as JSON: compact or pretty, and the nesting depth reached so far. Each
 // container increments the depth in its own copy before writing its children.
@@ -60,10 +62,11 @@ class SARN_EXPORT DictValue : public VekCore {
 
   // Equality by the receiver's rule; values of different kinds are never equal.
   virtual bool Equals(const ref<DictValue>& other) const = 0;
-  // Appends the JSON text of the value. Both forms write the same bytes.
+  // Appends the JSON text of the value. Both forms write the same bytes. Out of memory, the
+  // buffer is failed (ByteBuffer::HasFailed); a sink is told through the result of its Write.
   virtual void ToJson(ByteBuffer& out, JsonFormat format) const = 0;
   virtual void ToJson(wynbaselib::Bytesink& out, JsonFormat format) const = 0;
-  // The JSON text of the value as a new string in the value's pool.
+  // The JSON text of the value as a new string in the value's pool; empty when memory runs out.
   virtual VekString ToJson(bool pretty) const;
 
   const Kind kindM;
@@ -89,11 +92,13 @@ class SARN_EXPORT StringValue : public DictValue {
   bool GetValue(int& out) const;                 // as long long, within the 32-bit range
   bool GetValue(unsigned long long& out) const;  // sscanf "%llu"
   bool GetValue(unsigned int& out) const;        // as unsigned long long, at most 4294967295
-  // Always succeeds: the Base64 decoding of the text (empty when it does not decode).
+  // The Base64 decoding of the text (empty when it does not decode); false only when memory
+  // runs out.
   bool GetValue(ref<vek::ByteBuffer>& out) const;
 
   // New values in `pool`. 64-bit integers and texts are quoted; bools, 32-bit integers and
   // floats are bare (a float with a '.' is still written quoted by the writer's bare-text rule).
+  // Null when memory runs out (never a value with its text missing).
   static ref<StringValue> Make(const char* text, VekMempool* pool);
   static ref<StringValue> Make(const ref<vek::ByteBuffer>& bytes, VekMempool* pool);
   static ref<StringValue> Make(bool value, VekMempool* pool);
@@ -163,7 +168,7 @@ class SARN_EXPORT ArrayValue : public DictValue {
   VekGenericArray valuesM;
 
  private:
-  friend class TreeRelease;
+  friend class internal::TreeRelease;
   DictValue* pNextReleaseM;  // link of the per-thread release queue
 };
 

@@ -17,6 +17,9 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+using internal::TreeWalk;
+
 namespace {
 
 constexpr uint32_t kLinearNames = 8;
@@ -80,7 +83,7 @@ Dictionary::~Dictionary() {
 
 ref<Dictionary> Dictionary::New(VekMempool* pool, const VekString& typeName) {
   ref<Dictionary> dictionary = new (pool) Dictionary();
-  if (!typeName.FEmpty()) dictionary->Add(VekString("type"), typeName);
+  if (dictionary && !typeName.FEmpty() && !dictionary->Add(VekString("type"), typeName)) return ref<Dictionary>();
   return dictionary;
 }
 

@@ -28,8 +28,10 @@
 
 namespace sarn {
 
+namespace internal {
 class JsonReadSupport;
 class TreeWalk;
+}  // namespace internal
 class TreeWriter;
 
 class SARN_EXPORT Dictionary : public DictValue {
@@ -38,6 +40,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   ~Dictionary() override;
 
   // A new empty dictionary; a non-empty `typeName` is added as the quoted value of "type".
+  // Null when memory runs out.
   static ref<Dictionary> New(VekMempool* pool, const VekString& typeName);
 
   // Adds `value` after the values already under `name` (the value is shared, not copied).
@@ -114,8 +117,8 @@ class SARN_EXPORT Dictionary : public DictValue {
                                             const JsonLimits& limits);
 
  private:
-  friend class JsonReadSupport;
-  friend class TreeRelease;
+  friend class internal::JsonReadSupport;
+  friend class internal::TreeRelease;
 
   struct Entry {
     VekString nameM;
@@ -146,7 +149,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   };
   void SortedFirsts(SortKey* out) const;
   bool EqualsDictionary(const Dictionary& other) const;
-  friend class TreeWalk;
+  friend class internal::TreeWalk;
   friend class TreeWriter;
 
   Entry* vEntryM;

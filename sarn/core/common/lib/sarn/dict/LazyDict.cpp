@@ -11,6 +11,8 @@
 
 namespace sarn {
 
+using internal::TreeRelease;
+
 namespace {
 
 const char kUnknownRepForDictionaryG[] = "LazyDict to Dictionary: unknown representation in LazyDict";
@@ -41,8 +43,9 @@ bool TypeNameOfDictionary(const Dictionary& dictionary, VekString* name) {
 
 ref<Dictionary> MakeErrorDictionary(VekMempool* pool, const VekString& text) {
   ref<Dictionary> error = Dictionary::New(pool, VekString("error"));
-  error->Add(VekString("code"), VekString("badArgument"));
-  error->Add(VekString("text"), text);
+  if (!error || !error->Add(VekString("code"), VekString("badArgument")) || !error->Add(VekString("text"), text)) {
+    return ref<Dictionary>();
+  }
   return error;
 }
 
@@ -67,7 +70,10 @@ LazyDict::~LazyDict() {
 
 ref<LazyDict> LazyDict::New(VekMempool* pool, Rep rep, const ref<Dict>& dict, const ref<vek::ByteBuffer>& bytes,
                             const ref<SarnObject>& object, wynbaselib::Bytesource* bytesource, KernoVersion version) {
-  return ref<LazyDict>(new (pool) LazyDict(rep, dict, bytes, object, bytesource, version));
+  ref<LazyDict> payload = new (pool) LazyDict(rep, dict, bytes, object, bytesource, version);
+  // The payload owns the source; one that was never made cannot release it.
+  if (!payload) delete bytesource;
+  return payload;
 }
 
 ref<LazyDict> LazyDict::FromDict(VekMempool* pool, const ref<Dict>& dict, unsigned short version) {
@@ -95,7 +101,7 @@ ref<LazyDict> LazyDict::FromBytesource(VekMempool* pool, wynbaselib::Bytesource*
 
 ref<LazyDict> LazyDict::FromDictionary(VekMempool* pool, const ref<Dictionary>& dictionary, KernoVersion version) {
   ref<LazyDict> payload = New(pool, REP_DICTIONARY, nullptr, nullptr, nullptr, nullptr, version);
-  payload->SetDictionary(dictionary);
+  if (payload) payload->SetDictionary(dictionary);
   return payload;
 }
 
@@ -140,13 +146,15 @@ ref<Dict> LazyDict::ToDict() const {
     VekString error;
     ref<Dictionary> dictionary = Dictionary::FromJsonBytestring(bytesM, error, pMempoolM);
     if (!dictionary) dictionary = MakeErrorDictionary(pMempoolM, error);
+    if (!dictionary) return ref<Dict>();
     return MempoolNew<Dict>(pMempoolM, dictionary);
   }
   if (repM == REP_DICTIONARY && dictionaryM) return MempoolNew<Dict>(pMempoolM, dictionaryM);
   // Unknown representation, or a form converted by the object layer (not here yet).
   ref<Dict> error = Dict::New(pMempoolM, VekString("error"));
-  error->AddString("code", "internalError");
-  error->AddString("text", "bad rep in LazyDict");
+  if (!error || !error->AddString("code", "internalError") || !error->AddString("text", "bad rep in LazyDict")) {
+    return ref<Dict>();
+  }
   return error;
 }
 
@@ -179,15 +187,21 @@ ref<vek::ByteBuffer> LazyDict::ToJsonBytestring(bool pretty) const {
   if (repM == REP_JSON && bytesM && !pretty) return bytesM;
   ByteBuffer text(pMempoolM);
   ToJsonByteBuffer(text, pretty);
+  if (text.HasFailed()) return ref<vek::ByteBuffer>();
   return vek::ByteBuffer::New(pMempoolM, text.GetData(), text.GetLength());
 }
 
 VekString LazyDict::ToJson(bool pretty) const {
   ref<vek::ByteBuffer> bytes = ToJsonBytestring(pretty);
+  if (!bytes) return VekString();
   return VekString::FromUtf8Bytes(pMempoolM, bytes->GetLength(), bytes->GetData());
 }
 
-bool LazyDict::operator==(const LazyDict& other) const { return *ToDict() == *other.ToDict(); }
+bool LazyDict::operator==(const LazyDict& other) const {
+  ref<Dict> mine = ToDict();
+  ref<Dict> theirs = other.ToDict();
+  return mine && theirs && *mine == *theirs;
+}
 
 }  // namespace sarn
 

@@ -43,7 +43,8 @@ class SARN_EXPORT LazyDict : public VekCore {
     REP_BYTESOURCE = 5,  // pBytesourceM, JSON text still to be read
   };
 
-  // Stores the arguments (taking ownership of `bytesource`); dictionaryM starts null.
+  // Stores the arguments (taking ownership of `bytesource`); dictionaryM starts null. Every
+  // factory below returns null when memory runs out (New then deletes `bytesource`).
   LazyDict(Rep rep, const ref<Dict>& dict, const ref<vek::ByteBuffer>& bytes, const ref<SarnObject>& object,
            wynbaselib::Bytesource* bytesource, KernoVersion version);
   ~LazyDict() override;
@@ -75,26 +76,28 @@ class SARN_EXPORT LazyDict : public VekCore {
   // Null with the reader's message when stored JSON does not parse. Dict and Dictionary forms
   // return their own dictionary (shared).
   ref<Dictionary> ToDictionary(VekString& error) const;
-  // Never null: stored JSON that does not parse gives an "error" dictionary (code
-  // "badArgument", the reader's message as text). The Dict form returns dictM itself.
+  // Stored JSON that does not parse gives an "error" dictionary (code "badArgument", the
+  // reader's message as text); null only when memory runs out. The Dict form returns dictM.
   ref<Dict> ToDict() const;
   // Compact output of stored JSON is the stored bytes, unchecked. Pretty output parses them; when
   // they do not parse, the stored bytes are written unchanged rather than nothing.
   void ToJsonByteBuffer(ByteBuffer& out, bool pretty) const;
   void ToJsonBytesink(wynbaselib::Bytesink& out, bool pretty) const;
-  // Compact output of stored JSON returns bytesM itself (shared).
+  // Compact output of stored JSON returns bytesM itself (shared). Null (ToJson: empty) when
+  // memory runs out.
   ref<vek::ByteBuffer> ToJsonBytestring(bool pretty) const;
   VekString ToJson(bool pretty) const;
 
   // The payload as an object. The object form gives objectM itself (shared, not copied); on
   // failure the result is null with the reason in `error`.
   ref<SarnObject> ToSarnObjectOrErrorString(VekString& error) const;
-  // Never null: an `error` object (code badArgument) with the reason when there is no object.
+  // An `error` object (code badArgument) with the reason when there is no object; null only
+  // when memory runs out.
   ref<SarnObject> ToSarnObjectOrError() const;
   // The object or null, the reason discarded; true when there is one.
   bool ToSarnObject(ref<SarnObject>& out) const;
 
-  // Equal compact JSON texts of the two payloads' ToDict().
+  // Equal compact JSON texts of the two payloads' ToDict(); false when either cannot be made.
   bool operator==(const LazyDict& other) const;
   bool operator!=(const LazyDict& other) const { return !(*this == other); }
 

@@ -21,6 +21,8 @@
 
 namespace sarn {
 
+using internal::JsonReadSupport;
+
 namespace {
 
 using Byte = unsigned char;
@@ -114,6 +116,9 @@ class HandReader {
   bool ReadScalar(InputPointer& input, DictValue*& value);
   void SetDepthError() { errorM = VekString::Format(supportM.Pool(), kJsonDepthLimitFormat, maxDepthM); }
   VekMempool* Pool() const { return supportM.Pool(); }
+  // True once a read failed because the pool ran out: the failure then says so, with no
+  // words about the value's syntax.
+  bool WasOutOfMemory() const { return wasOutOfMemoryM; }
 
  private:
   bool ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text);
@@ -124,11 +129,18 @@ class HandReader {
   // its suffix), then the words of every open container from the top down.
   bool FailValue(const char* message, bool isScalar);
   bool Fail(const char* message, const VekString& tail, bool isScalar, uint32_t nFrame);
+  bool OutOfMemory() {
+    wasOutOfMemoryM = true;
+    return false;
+  }
+  // OutOfMemory with the message that ReadScalar's callers expect in errorM.
+  bool ScalarOutOfMemory();
 
   JsonReadSupport supportM;
   FrameStack framesM;
   int maxDepthM;
   VekString& errorM;
+  bool wasOutOfMemoryM = false;
 };
 
 bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text) {
@@ -140,6 +152,7 @@ bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, 
       size_t n = static_cast<size_t>(q - start - 1);
       text = isKey ? supportM.Key(reinterpret_cast<const char*>(start + 1), n)
                    : VekString::FromUtf8Bytes(Pool(), n, start + 1);
+      if (text.FEmpty() && n != 0) return OutOfMemory();
       p = q + 1;
       return true;
     }
@@ -147,12 +160,15 @@ bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, 
     input.pCurM = AsCursor(start);
     bool isRead = Json::JsonToString(Pool(), nullptr, input, text);
     p = AsBytes(input.pCurM);
+    // Malformed text fails past the opening quote; only a lack of memory fails on it.
+    if (!isRead && p == start) return OutOfMemory();
     return isRead;
   }
   const Byte* q = p;
   while (q < end && kTokenG.vIsTokenM[*q]) ++q;
   size_t n = static_cast<size_t>(q - p);
   text = isKey ? supportM.Key(reinterpret_cast<const char*>(p), n) : VekString::FromUtf8Bytes(Pool(), n, p);
+  if (text.FEmpty() && n != 0) return OutOfMemory();
   p = q;
   return true;
 }
@@ -168,7 +184,7 @@ bool HandReader::ReadScalar(InputPointer& input, DictValue*& value) {
     return false;
   }
   if (!ReadText(p, end, input, false, text)) {
-    errorM = VekString::Format(Pool(), "%s", "Can't parse scalar field");
+    errorM = VekString::Format(Pool(), "%s", wasOutOfMemoryM ? kOutOfMemoryMessage : "Can't parse scalar field");
     return false;
   }
   input.pCurM = AsCursor(p);
@@ -179,13 +195,19 @@ bool HandReader::ReadScalar(InputPointer& input, DictValue*& value) {
     }
     if (text.NByte() == 4 && std::memcmp(text.Utf8(), "null", 4) == 0) {
       value = new (Pool()) NullValue();
-      return true;
+      return value != nullptr || ScalarOutOfMemory();
     }
   }
   StringValue* scalar = new (Pool()) StringValue(static_cast<VekString&&>(text));
+  if (scalar == nullptr) return ScalarOutOfMemory();
   scalar->needQuotesM = isQuoted;
   value = scalar;
   return true;
+}
+
+bool HandReader::ScalarOutOfMemory() {
+  errorM = VekString::Format(Pool(), "%s", kOutOfMemoryMessage);
+  return OutOfMemory();
 }
 
 bool HandReader::FailOwn(const char* message, const VekString& tail) {
@@ -268,7 +290,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         continue;
       }
       if (!ReadText(p, end, input, true, key)) {
-        isOk = FailOwn("Failed to parse a Dictionary key.");
+        isOk = FailOwn(wasOutOfMemoryM ? kOutOfMemoryMessage : "Failed to parse a Dictionary key.");
         break;
       }
       if (JsonReadSupport::Has(*static_cast<Dictionary*>(frame.pContainerM), key.Utf8(), key.NByte())) {
@@ -300,10 +322,14 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
       }
       value = *p == '{' ? static_cast<DictValue*>(new (Pool()) Dictionary())
                         : static_cast<DictValue*>(new (Pool()) ArrayValue());
+      if (value == nullptr) {
+        isOk = FailValue(kOutOfMemoryMessage, false);
+        break;
+      }
     } else {
       input.pCurM = AsCursor(p);
       if (!ReadScalar(input, value)) {
-        isOk = FailValue(VekString(errorM).Utf8(), true);
+        isOk = FailValue(VekString(errorM).Utf8(), !wasOutOfMemoryM);
         break;
       }
       p = AsBytes(input.pCurM);
@@ -313,12 +339,12 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
                                    : static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Add(value);
     if (!isAdded) {
       delete value;
-      isOk = FailValue("Out of memory.", false);
+      isOk = FailValue(kOutOfMemoryMessage, false);
       break;
     }
     if (isContainer) {
       if (!framesM.Push(value, value->kindM == DictValue::KIND_DICTIONARY)) {
-        isOk = FailValue("Out of memory.", false);
+        isOk = FailValue(kOutOfMemoryMessage, false);
         break;
       }
       ++depth;
@@ -352,15 +378,15 @@ bool ReadOneValue(InputPointer& input, VekMempool* pool, const JsonLimits& limit
     }
     ref<DictValue> child = *p == '{' ? static_cast<DictValue*>(new (pool) Dictionary())
                                      : static_cast<DictValue*>(new (pool) ArrayValue());
-    if (!attach(child)) {
-      error = VekString::Format(pool, "%s", "Out of memory.");
+    if (!child || !attach(child)) {
+      error = VekString::Format(pool, "%s", kOutOfMemoryMessage);
       return false;
     }
     return reader.ReadContainer(input, child.Get(), 2);
   }
   DictValue* scalar;
   if (!reader.ReadScalar(input, scalar)) {
-    AppendToError(error, pool, scalarSuffix, key);
+    if (!reader.WasOutOfMemory()) AppendToError(error, pool, scalarSuffix, key);
     return false;
   }
   ref<DictValue> value = scalar;
@@ -386,6 +412,10 @@ ref<Dictionary> ReadDocument(const Byte* data, size_t length, VekString& error, 
     return ref<Dictionary>();
   }
   ref<Dictionary> result = new (mempool) Dictionary();
+  if (!result) {
+    error = VekString::Format(mempool, "%s", kOutOfMemoryMessage);
+    return ref<Dictionary>();
+  }
   InputPointer input;
   input.pCurM = AsCursor(p);
   input.pEndM = AsCursor(end);

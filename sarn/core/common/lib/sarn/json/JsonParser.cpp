@@ -16,6 +16,8 @@
 
 namespace sarn {
 
+using internal::JsonReadSupport;
+
 namespace {
 
 const char kSourcePathG[] = "sarn/core/common/lib/sarn/JsonParser";
@@ -108,7 +110,7 @@ bool JsonParser::DictStack::Pop(nonRef<DictValue>& value, State& state) {
 JsonParser::JsonParser(VekMempool* mempool) : JsonParser(mempool, JsonLimits()) {}
 
 JsonParser::JsonParser(VekMempool* mempool, const JsonLimits& limits)
-    : allocFuncsM{JsonParser::Malloc, JsonParser::Realloc, JsonParser::Free, mempool},
+    : allocFuncsM{JsonParser::Malloc, JsonParser::Realloc, JsonParser::Free, this},
       pYajlHandleM(nullptr),
       statusM(yajl_status_error),
       pErrorTextM(nullptr),
@@ -156,8 +158,7 @@ void JsonParser::BeginParse(PDictionary& result) {
 
 bool JsonParser::ParseChunk(const char* data, size_t length) {
   Check(pYajlHandleM != nullptr, "wasParsingStarted");
-  statusM = yajl_parse(pYajlHandleM, reinterpret_cast<const unsigned char*>(data), length);
-  ErrorToString(statusM);
+  TakeStatus(yajl_parse(pYajlHandleM, reinterpret_cast<const unsigned char*>(data), length));
   if (statusM != yajl_status_ok) wasChunkRefusedM = true;
   return statusM == yajl_status_ok;
 }
@@ -167,10 +168,7 @@ bool JsonParser::EndParse() {
     Check(pYajlHandleM != nullptr, "wasBeginParseCalled");
     // After a refused chunk yajl would only add a second opinion ("premature EOF") over the
     // reason already given; the first failure is the answer.
-    if (!wasChunkRefusedM) {
-      statusM = yajl_complete_parse(pYajlHandleM);
-      ErrorToString(statusM);
-    }
+    if (!wasChunkRefusedM) TakeStatus(yajl_complete_parse(pYajlHandleM));
     isParseEndedM = true;
   }
   return statusM == yajl_status_ok;
@@ -183,6 +181,13 @@ JsonParser::State JsonParser::GetState() const {
 
 // ---------------------------------------------------------------------------------------------
 // Errors
+
+void JsonParser::TakeStatus(yajl_status status) {
+  // A callback's stop is always yajl's client cancel; only the allocator records a reason
+  // without one, and yajl may have carried on to the end of the chunk after it.
+  statusM = pCancelTextM == kOutOfMemoryMessage ? yajl_status_client_canceled : status;
+  ErrorToString(statusM);
+}
 
 void JsonParser::ReleaseErrorText() {
   if (pErrorTextM != nullptr && pErrorTextM != ErrorMessageJsonIsNotAMap && pErrorTextM != pCancelTextM) {
@@ -232,24 +237,35 @@ bool JsonParser::EnterContainer() {
 // Allocation
 
 void* JsonParser::Malloc(void* context, size_t size) {
-  Check(context != nullptr, "NULL != context");
-  return static_cast<VekMempool*>(context)->Malloc(size);
+  JsonParser* parser = ParserOf(context);
+  void* memory = parser->pMempoolM->Malloc(size);
+  if (memory != nullptr) return memory;
+  // The loan: yajl would write through a null. Its blocks are freed through the pool that
+  // each one records, so a loaned block goes back to the default pool.
+  parser->OutOfMemory();
+  return VekMempool::Default()->Malloc(size);
 }
 
 void* JsonParser::Realloc(void* context, void* pointer, size_t size) {
-  Check(context != nullptr, "NULL != context");
-  VekMempool* pool = static_cast<VekMempool*>(context);
-  if (pointer == nullptr) return pool->Malloc(size);
+  if (pointer == nullptr) return Malloc(context, size);
+  VekMempool* pool = VekMempool::PoolOf(pointer);
   if (size == 0) {
     pool->Free(pointer);
     return nullptr;
   }
-  return pool->Realloc(pointer, size);
+  void* memory = pool->Realloc(pointer, size);
+  if (memory != nullptr) return memory;
+  ParserOf(context)->OutOfMemory();
+  memory = VekMempool::Default()->Malloc(size);
+  if (memory == nullptr) return nullptr;
+  size_t nKeep = VekMempool::SizeOf(pointer);
+  std::memcpy(memory, pointer, nKeep < size ? nKeep : size);
+  pool->Free(pointer);
+  return memory;
 }
 
-void JsonParser::Free(void* context, void* pointer) {
-  Check(context != nullptr, "NULL != context");
-  static_cast<VekMempool*>(context)->Free(pointer);
+void JsonParser::Free(void*, void* pointer) {
+  if (pointer != nullptr) VekMempool::PoolOf(pointer)->Free(pointer);
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -273,23 +289,34 @@ bool JsonParser::AddNode(DictValue* value) {
 }
 
 int JsonParser::AddFresh(DictValue* value) {
+  if (value == nullptr) return OutOfMemory();
   if (AddNode(value)) return 1;
   delete value;
   return 0;
 }
 
+int JsonParser::AddText(VekString&& text, size_t length, bool needQuotes) {
+  if (text.FEmpty() && length != 0) return OutOfMemory();
+  StringValue* value = new (pMempoolM) StringValue(static_cast<VekString&&>(text));
+  if (value != nullptr) value->needQuotesM = needQuotes;
+  return AddFresh(value);
+}
+
+// An append fails at the container's limit or for lack of memory; the count tells which.
 bool JsonParser::AddToMap(DictValue* value) {
   Check(!dictionaryStackM.IsEmpty(), "!dictionaryStackM.IsEmpty()");
   Check(pCurrentMapM != nullptr, "NULL != pCurrentMapM");
   if (JsonReadSupport::Add(*pCurrentMapM, currentKeyM, value)) return true;
-  return Cancel(kJsonRepeatedKeyLimitMessage) != 0;
+  bool isFull = pCurrentMapM->CountValues(currentKeyM) >= kMaxValuesPerContainer;
+  return Cancel(isFull ? kJsonRepeatedKeyLimitMessage : kOutOfMemoryMessage) != 0;
 }
 
 bool JsonParser::AddToArray(DictValue* value) {
   Check(!dictionaryStackM.IsEmpty(), "!dictionaryStackM.IsEmpty()");
   Check(pCurrentArrayM != nullptr, "NULL != pCurrentArrayM");
   if (pCurrentArrayM->valuesM.Add(value)) return true;
-  return Cancel(kJsonArrayLimitMessage) != 0;
+  bool isFull = pCurrentArrayM->valuesM.Count() >= kMaxValuesPerContainer;
+  return Cancel(isFull ? kJsonArrayLimitMessage : kOutOfMemoryMessage) != 0;
 }
 
 bool JsonParser::SetScalar() {
@@ -298,6 +325,7 @@ bool JsonParser::SetScalar() {
 }
 
 bool JsonParser::SetMap(PDictionary& map) {
+  if (!map) return OutOfMemory() != 0;
   if (dictionaryStackM.IsEmpty()) {
     *pResultM = map;
   } else if (!AddNode(map.Get())) {
@@ -305,7 +333,7 @@ bool JsonParser::SetMap(PDictionary& map) {
   }
   pCurrentMapM = map.Get();
   pCurrentArrayM = nullptr;
-  return dictionaryStackM.Push(map.Get(), StateMap);
+  return dictionaryStackM.Push(map.Get(), StateMap) || OutOfMemory() != 0;
 }
 
 bool JsonParser::SetArray(ref<ArrayValue>& array) {
@@ -313,10 +341,11 @@ bool JsonParser::SetArray(ref<ArrayValue>& array) {
     isJsonAMapM = false;
     return false;
   }
+  if (!array) return OutOfMemory() != 0;
   if (!AddNode(array.Get())) return false;
   pCurrentMapM = nullptr;
   pCurrentArrayM = array.Get();
-  return dictionaryStackM.Push(array.Get(), StateArray);
+  return dictionaryStackM.Push(array.Get(), StateArray) || OutOfMemory() != 0;
 }
 
 bool JsonParser::RestorePreviousState() {
@@ -349,30 +378,24 @@ int JsonParser::OnNull(void* context) {
 
 int JsonParser::OnBoolean(void* context, int value) {
   JsonParser* parser = ParserOf(context);
-  StringValue* text = new (parser->pMempoolM) StringValue(parser->KeyText(value ? "true" : "false", value ? 4 : 5));
-  text->needQuotesM = false;
-  return parser->AddFresh(text);
+  size_t length = value ? 4 : 5;
+  return parser->AddText(parser->KeyText(value ? "true" : "false", length), length, false);
 }
 
 int JsonParser::OnNumber(void* context, const char* text, size_t length) {
   JsonParser* parser = ParserOf(context);
-  StringValue* number =
-      new (parser->pMempoolM) StringValue(VekString::FromUtf8Bytes(parser->pMempoolM, length, text));
-  number->needQuotesM = false;
-  return parser->AddFresh(number);
+  return parser->AddText(VekString::FromUtf8Bytes(parser->pMempoolM, length, text), length, false);
 }
 
 int JsonParser::OnString(void* context, const unsigned char* text, size_t length) {
   JsonParser* parser = ParserOf(context);
-  StringValue* string =
-      new (parser->pMempoolM) StringValue(VekString::FromUtf8Bytes(parser->pMempoolM, length, text));
-  return parser->AddFresh(string);
+  return parser->AddText(VekString::FromUtf8Bytes(parser->pMempoolM, length, text), length, true);
 }
 
 int JsonParser::OnMapKey(void* context, const unsigned char* text, size_t length) {
   JsonParser* parser = ParserOf(context);
   parser->currentKeyM = parser->KeyText(reinterpret_cast<const char*>(text), length);
-  return 1;
+  return !parser->currentKeyM.FEmpty() || length == 0 || parser->OutOfMemory() != 0;
 }
 
 int JsonParser::OnStartMap(void* context) {

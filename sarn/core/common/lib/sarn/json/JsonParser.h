@@ -25,7 +25,9 @@
 
 namespace sarn {
 
+namespace internal {
 class JsonReadSupport;
+}  // namespace internal
 
 typedef ref<Dictionary> PDictionary;
 typedef ref<DictValue> PDictValue;
@@ -81,7 +83,8 @@ class SARN_EXPORT JsonParser {
   // Builds a tree; the top-level object is stored in `result` (which the caller sets to null and
   // keeps alive until the parser is gone).
   void BeginParse(PDictionary& result);
-  // Feeds one chunk; false on a syntax error or a refused document (pErrorTextM says why).
+  // Feeds one chunk; false on a syntax error, a refused document or a lack of memory
+  // (pErrorTextM says why: kOutOfMemoryMessage for the last).
   // After a failure the parser is not fed again.
   bool ParseChunk(const char* data, size_t length);
   // Ends the document (yajl then checks that it is complete). A second call repeats the answer.
@@ -89,7 +92,10 @@ class SARN_EXPORT JsonParser {
   // The kind of the innermost open container, StateNone at the top level.
   State GetState() const;
 
-  // yajl's allocation functions; their context is the pool.
+  // yajl's allocation functions; their context is the parser. yajl writes through what its
+  // allocator returns without a check, so these never return null: when the parser's pool runs
+  // out they lend a block of the default pool and stop the parse with kOutOfMemoryMessage at
+  // the next callback or at the end of the chunk, whichever comes first.
   static void* Malloc(void* context, size_t size);
   static void* Realloc(void* context, void* pointer, size_t size);
   static void Free(void* context, void* pointer);
@@ -132,7 +138,13 @@ class SARN_EXPORT JsonParser {
   bool AddNode(DictValue* value);
   // AddNode for a node nobody references yet: destroyed on failure. Returns the callback answer.
   int AddFresh(DictValue* value);
-  // A key or literal text, shared through the key cache.
+  // Stops the parse because the pool ran out. Returns the callback answer (0).
+  int OutOfMemory() { return Cancel(kOutOfMemoryMessage); }
+  // A new StringValue of `text` (which came from `length` bytes) added to the open container.
+  int AddText(VekString&& text, size_t length, bool needQuotes);
+  // After yajl returns: a stop for lack of memory overrides what yajl said.
+  void TakeStatus(yajl_status status);
+  // A key or literal text, shared through the key cache; empty when memory runs out.
   VekString KeyText(const char* text, size_t length);
   bool AddToMap(DictValue* value);
   bool AddToArray(DictValue* value);
@@ -151,7 +163,7 @@ class SARN_EXPORT JsonParser {
   int maxDepthM;
   bool wasChunkRefusedM;    // a chunk failed: EndParse keeps that answer
   const char* pCancelTextM;  // why our callbacks stopped the parse, or null
-  JsonReadSupport* pSupportM;
+  internal::JsonReadSupport* pSupportM;
   char depthTextM[80];
 };
 

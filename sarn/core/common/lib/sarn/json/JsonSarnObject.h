@@ -8,8 +8,9 @@
 // sorts below "type", or last when there is none. BOOL, S32 and U32 values are bare; every other
 // scalar travels as a quoted string. A null element of a reference array is left out.
 //
-// Writing never fails and does not recurse on the depth of the object tree: nested objects (also
-// objects held by lazy payloads) are walked with an explicit stack, so any depth is written.
+// Writing does not recurse on the depth of the object tree: nested objects (also objects held by
+// lazy payloads) are walked with an explicit stack, so any depth is written; it fails only when
+// memory runs out.
 //
 // Ownership and pools: the converter owns nothing but its scratch array; the strings it makes live
 // in pMempoolM and are released before a call returns; the caller owns the output buffer.
@@ -39,9 +40,10 @@ class SARN_EXPORT JsonSarnObject {
   JsonSarnObject(const JsonSarnObject&) = delete;
   JsonSarnObject& operator=(const JsonSarnObject&) = delete;
 
-  // Appends the JSON text of `object` (and everything it holds) to `out`.
-  void SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out);
-  // The same text as a new string in pMempoolM.
+  // Appends the JSON text of `object` (and everything it holds) to `out`. False only when memory
+  // runs out; `out` is then failed (ByteBuffer::HasFailed) rather than left with a piece missing.
+  bool SarnObjectToJson(const SarnObject* object, KernoVersion version, ByteBuffer& out);
+  // The same text as a new string in pMempoolM; empty when memory runs out.
   VekString SarnObjectToJson(const SarnObject* object, KernoVersion version);
 
   // One optional or required field (presence is the caller's test). Reference values that are
@@ -64,22 +66,8 @@ class SARN_EXPORT JsonSarnObject {
   VekGenericIntArray vObjectTypesM;
 
  private:
-  struct Frame;
-  class FrameStack;
-  // The StructInfo of type id `id` in pStructDefsM, or null.
-  const StructInfo* StructDef(unsigned id) const {
-    return id < nStructDefsM ? pStructDefsM[id] : nullptr;
-  }
-  // The walk: frames for objects and for arrays of objects, pushed as they are met.
-  void PushObject(FrameStack& stack, const SarnObject* object, KernoVersion version, ByteBuffer& out);
-  void PushArray(FrameStack& stack, const FieldInfo& field, const SarnObject* object, KernoVersion version,
-                 ByteBuffer& out);
-  void PushValue(FrameStack& stack, const FieldInfo& field, const SarnObject* object, unsigned i,
-                 KernoVersion version, ByteBuffer& out);
-  void Walk(FrameStack& stack, ByteBuffer& out);
-  void WriteTypeMember(const StructInfo* info, ByteBuffer& out, bool& fFirst);
-  // Value `i` of a field whose values are not schema objects.
-  void WriteValue(const FieldInfo& field, const SarnObject* object, unsigned i, ByteBuffer& out);
+  // The format's side of the shared object walk (model/internal/ObjectWalk.h).
+  class Writer;
 };
 
 }  // namespace sarn

@@ -1,21 +1,22 @@
-// FieldAccess: the values of one field of a schema object, read and written through its FieldInfo,
-// so that every walker (JSON out, Dictionary out and in, and later ones) shares one way of reaching
-// single values and the elements of multi-valued arrays.
+// The field-access layer: how every walker (JSON, Dictionary and binary writers and readers,
+// equality, copy) reaches the values of one field of a schema object through its FieldInfo, and
+// what it needs to know about each data type, so that no walker reads a generated class or keeps
+// a table of its own.
 //
-// A field is seen as a list of values: a single (optional or required) field is one value at index
-// 0; a multi-valued field is its platform array. Each value is reached in one of three storage
-// forms, chosen by the data type:
-//   scalar     1, 4 or 8 bytes in place (BOOL; DATE, TIME, ENUM, INT_ID, S32, U32; CHANNEL_NUMBER,
-//              CURRENCY, DATETIME, FLOAT, LONG_ID, S64, U64), arrays are VekGenericIntArray;
+// Per data type there is one row of DataTypeTraits (how a value is stored, its width, whether it
+// holds schema objects, whether it has a text form, whether JSON quotes it, its wire type). A
+// field is seen as a list of values: a single (optional or required) field is one value at index
+// 0; a multi-valued field is its platform array. Each value is stored in one of three forms:
+//   scalar     1, 4 or 8 bytes in place, arrays are VekGenericIntArray;
 //   string     a VekString (STRING, STRING_ID), arrays are VekStringArray;
 //   reference  a counted pointer to a VekCore (BYTESTRING, ANY_DICT, KNOWN_DICT, SUBDICT,
 //              KNOWN_DICT_AS_LAZY), arrays are VekGenericArray.
 // The Put* operations store into a single field or append to a multi-valued one, by the record's
-// arity, so a reader converts a value once and lets the record decide where it goes.
+// arity, so a reader converts a value once and lets the record decide where it goes. Presence of
+// optional fields is read and set here too (IsFieldPresent, MarkFieldPresent).
 //
 // Ownership: reading hands out pointers into the object (valid while the object is unchanged);
 // PutReference takes its own reference on the stored object and releases the one it replaces.
-// Presence flags are not touched here (see MarkFieldPresent and IsFieldPresent in SarnObject.h).
 //
 // Thread safety: none; the object belongs to one thread while it is written.
 #pragma once
@@ -32,20 +33,141 @@
 
 namespace sarn {
 
-class SARN_EXPORT FieldAccess {
- public:
-  enum Storage {
+// What every walker needs to know about one data type.
+struct DataTypeTraits {
+  enum Storage : uint8_t {
     STORAGE_SCALAR = 0,
     STORAGE_STRING = 1,
     STORAGE_REFERENCE = 2,
     STORAGE_NONE = 3,  // data type codes outside 0..20
   };
+  uint8_t dataType;     // the row's own code, checked against its index below
+  Storage storage;
+  uint8_t width;        // bytes of one scalar value (1, 4 or 8); 0 for the other forms
+  bool fHoldsObjects;   // a value is (or, for a lazy payload, may hold) a schema object
+  bool fHasText;        // a value has a text form of its own (all but dictionaries and objects)
+  bool fQuotedInJson;   // that text is a JSON string (BOOL, S32 and U32 travel bare)
+  uint8_t wireType;     // protocol-buffer wire type: 0 varint, 1 eight bytes, 2 length-delimited
 
-  static Storage StorageOf(unsigned dataType) {
-    return dataType < kTypeCount ? static_cast<Storage>(kStorage[dataType]) : STORAGE_NONE;
+  // A null reference of this type is no value at all and is left out by every writer. A null
+  // byte string is not: it has a text form (the empty one).
+  constexpr bool IsNullAbsent() const { return storage == STORAGE_REFERENCE && !fHasText; }
+};
+
+namespace internal {
+
+constexpr DataTypeTraits::Storage kScalar = DataTypeTraits::STORAGE_SCALAR;
+constexpr DataTypeTraits::Storage kString = DataTypeTraits::STORAGE_STRING;
+constexpr DataTypeTraits::Storage kReference = DataTypeTraits::STORAGE_REFERENCE;
+
+inline constexpr DataTypeTraits kDataTypeTraitsG[] = {
+    {SARN_DATA_TYPE_BOOL, kScalar, 1, false, true, false, 0},
+    {SARN_DATA_TYPE_BYTESTRING, kReference, 0, false, true, true, 2},
+    {SARN_DATA_TYPE_CHANNEL_NUMBER, kScalar, 8, false, true, true, 2},
+    {SARN_DATA_TYPE_CURRENCY, kScalar, 8, false, true, true, 2},
+    {SARN_DATA_TYPE_DATE, kScalar, 4, false, true, true, 0},
+    {SARN_DATA_TYPE_DATETIME, kScalar, 8, false, true, true, 0},
+    {SARN_DATA_TYPE_ANY_DICT, kReference, 0, false, false, false, 2},
+    {SARN_DATA_TYPE_ENUM, kScalar, 4, false, true, true, 0},
+    {SARN_DATA_TYPE_FLOAT, kScalar, 8, false, true, true, 1},
+    {SARN_DATA_TYPE_INT_ID, kScalar, 4, false, true, true, 0},
+    {SARN_DATA_TYPE_LONG_ID, kScalar, 8, false, true, true, 0},
+    {SARN_DATA_TYPE_STRING_ID, kString, 0, false, true, true, 2},
+    {SARN_DATA_TYPE_KNOWN_DICT, kReference, 0, true, false, false, 2},
+    {SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY, kReference, 0, true, false, false, 2},
+    {SARN_DATA_TYPE_SUBDICT, kReference, 0, true, false, false, 2},
+    {SARN_DATA_TYPE_S64, kScalar, 8, false, true, true, 0},
+    {SARN_DATA_TYPE_S32, kScalar, 4, false, true, false, 0},
+    {SARN_DATA_TYPE_STRING, kString, 0, false, true, true, 2},
+    {SARN_DATA_TYPE_TIME, kScalar, 4, false, true, true, 0},
+    {SARN_DATA_TYPE_U32, kScalar, 4, false, true, false, 0},
+    {SARN_DATA_TYPE_U64, kScalar, 8, false, true, true, 0},
+};
+inline constexpr unsigned kDataTypeCountG = sizeof kDataTypeTraitsG / sizeof kDataTypeTraitsG[0];
+// Codes 21..31 (the placeholder's and unused ones): nothing to read, skipped by every walker.
+inline constexpr DataTypeTraits kNoDataTypeG = {SARN_DATA_TYPE_PLACEHOLDER, DataTypeTraits::STORAGE_NONE, 0, false, false, false, 0};
+
+constexpr bool TraitsAreConsistent() {
+  for (unsigned code = 0; code < kDataTypeCountG; ++code) {
+    const DataTypeTraits& t = kDataTypeTraitsG[code];
+    if (t.dataType != code) return false;                                   // one row per code, in order
+    if ((t.storage == kScalar) != (t.width != 0)) return false;   // only scalars have a width
+    if (t.width != 0 && t.width != 1 && t.width != 4 && t.width != 8) return false;
+    if (t.fHoldsObjects && (t.storage != kReference || t.fHasText)) return false;
+    if (!t.fHasText && t.fQuotedInJson) return false;
+    if (t.wireType > 2 || (t.storage != kScalar && t.wireType != 2)) return false;
+    if (t.wireType == 1 && t.width != 8) return false;
   }
+  return true;
+}
+
+}  // namespace internal
+
+static_assert(internal::kDataTypeCountG == SARN_DATA_TYPE_U64 + 1, "one traits row per data type code");
+static_assert(internal::TraitsAreConsistent(), "data type traits rows are in code order and agree with each other");
+
+// The row of `dataType`; codes past U64 get a row with storage NONE.
+constexpr const DataTypeTraits& TraitsOf(unsigned dataType) {
+  return dataType < internal::kDataTypeCountG ? internal::kDataTypeTraitsG[dataType] : internal::kNoDataTypeG;
+}
+
+static_assert(TraitsOf(SARN_DATA_TYPE_BOOL).width == 1 && TraitsOf(SARN_DATA_TYPE_ENUM).width == sizeof(uint32_t) &&
+                  TraitsOf(SARN_DATA_TYPE_LONG_ID).width == sizeof(uint64_t) &&
+                  TraitsOf(SARN_DATA_TYPE_FLOAT).width == sizeof(double),
+              "scalar widths are the widths of the stored C++ types");
+static_assert(!TraitsOf(SARN_DATA_TYPE_S32).fQuotedInJson && TraitsOf(SARN_DATA_TYPE_S64).fQuotedInJson &&
+                  TraitsOf(SARN_DATA_TYPE_STRING).fQuotedInJson,
+              "JSON writes 32-bit integers bare and 64-bit ones as strings");
+static_assert(TraitsOf(SARN_DATA_TYPE_PLACEHOLDER).storage == DataTypeTraits::STORAGE_NONE, "placeholder has no value");
+
+// Address of the storage of `field` in `object` (a value, a reference, or a platform array).
+inline void* FieldStorage(SarnObject* object, const FieldInfo& field) {
+  return reinterpret_cast<unsigned char*>(object) + field.valueOffset;
+}
+inline const void* FieldStorage(const SarnObject* object, const FieldInfo& field) {
+  return reinterpret_cast<const unsigned char*>(object) + field.valueOffset;
+}
+// Typed access to the storage of `field`; T must be the member type the data type and arity give.
+template <class T>
+inline T& FieldRef(SarnObject* object, const FieldInfo& field) {
+  return *static_cast<T*>(FieldStorage(object, field));
+}
+template <class T>
+inline const T& FieldRef(const SarnObject* object, const FieldInfo& field) {
+  return *static_cast<const T*>(FieldStorage(object, field));
+}
+
+// NONE is never present; REQUIRED and MULTI always are; an OPTIONAL field is present when its
+// flag byte is non-zero, or, without a flag byte (the reference kinds), when its reference is
+// non-null.
+inline bool IsFieldPresent(const SarnObject* object, const FieldInfo& field) {
+  switch (field.arity) {
+    case SARN_ARITY_NONE:
+      return false;
+    case SARN_ARITY_OPTIONAL:
+      if (field.flagOffset != 0) return reinterpret_cast<const unsigned char*>(object)[field.flagOffset] != 0;
+      return FieldRef<const void*>(object, field) != nullptr;
+    default:
+      return true;
+  }
+}
+// Records that an optional field now holds a value (sets its flag byte when it has one; a
+// flagless reference field is present through its non-null reference).
+inline void MarkFieldPresent(SarnObject* object, const FieldInfo& field) {
+  if (field.flagOffset != 0) reinterpret_cast<unsigned char*>(object)[field.flagOffset] = 1;
+}
+
+class SARN_EXPORT FieldAccess {
+ public:
+  using Storage = DataTypeTraits::Storage;
+  static constexpr Storage STORAGE_SCALAR = DataTypeTraits::STORAGE_SCALAR;
+  static constexpr Storage STORAGE_STRING = DataTypeTraits::STORAGE_STRING;
+  static constexpr Storage STORAGE_REFERENCE = DataTypeTraits::STORAGE_REFERENCE;
+  static constexpr Storage STORAGE_NONE = DataTypeTraits::STORAGE_NONE;
+
+  static Storage StorageOf(unsigned dataType) { return TraitsOf(dataType).storage; }
   // Bytes of one scalar value (1, 4 or 8); 0 for the other storage forms.
-  static unsigned ScalarWidth(unsigned dataType) { return dataType < kTypeCount ? kWidth[dataType] : 0; }
+  static unsigned ScalarWidth(unsigned dataType) { return TraitsOf(dataType).width; }
 
   // Number of values: the array's count for a multi-valued field, else 1.
   static unsigned Count(const SarnObject* object, const FieldInfo& field) {
@@ -94,14 +216,6 @@ class SARN_EXPORT FieldAccess {
   static bool PutScalar(SarnObject* object, const FieldInfo& field, const void* value);
   static bool PutString(SarnObject* object, const FieldInfo& field, const VekString& value);
   static bool PutReference(SarnObject* object, const FieldInfo& field, VekCore* value);
-
- private:
-  static constexpr unsigned kTypeCount = 21;
-  // By data type code: BOOL, BYTESTRING, CHANNEL_NUMBER, CURRENCY, DATE, DATETIME, ANY_DICT, ENUM,
-  // FLOAT, INT_ID, LONG_ID, STRING_ID, KNOWN_DICT, KNOWN_DICT_AS_LAZY, SUBDICT, S64, S32, STRING,
-  // TIME, U32, U64.
-  static constexpr uint8_t kStorage[kTypeCount] = {0, 2, 0, 0, 0, 0, 2, 0, 0, 0, 0, 1, 2, 2, 2, 0, 0, 1, 0, 0, 0};
-  static constexpr uint8_t kWidth[kTypeCount] = {1, 0, 8, 8, 4, 8, 0, 4, 8, 4, 8, 0, 0, 0, 0, 8, 4, 0, 4, 4, 8};
 };
 
 }  // namespace sarn

@@ -1,5 +1,5 @@
-// SarnObject: the base class of every generated schema type, and the small field-access layer the
-// walkers use to read and write a field through its FieldInfo.
+// SarnObject: the base class of every generated schema type. Its fields are read and written
+// through their FieldInfo by the field-access layer (FieldAccess.h), never through the classes.
 //
 // Layout (a format: FieldInfo offsets address it): the VekCore part (virtual table, pool, 32-bit
 // reference count) in bytes 0-19, the type id in bytes 20-23, then the generated class's presence
@@ -40,30 +40,5 @@ class SARN_EXPORT SarnObject : public VekCore {
   uint32_t typeIdM;
 };
 static_assert(sizeof(SarnObject) == 24, "SarnObject header is 24 bytes");
-
-// The field-access layer. Every walker reads and writes fields through these, never through the
-// generated classes.
-
-// Address of the storage of `field` in `object` (a value, a reference, or a platform array).
-inline void* FieldStorage(SarnObject* object, const FieldInfo& field) {
-  return reinterpret_cast<unsigned char*>(object) + field.valueOffset;
-}
-inline const void* FieldStorage(const SarnObject* object, const FieldInfo& field) {
-  return reinterpret_cast<const unsigned char*>(object) + field.valueOffset;
-}
-// Typed access to the storage of `field`; T must be the member type the data type and arity give.
-template <class T>
-inline T& FieldRef(SarnObject* object, const FieldInfo& field) {
-  return *static_cast<T*>(FieldStorage(object, field));
-}
-template <class T>
-inline const T& FieldRef(const SarnObject* object, const FieldInfo& field) {
-  return *static_cast<const T*>(FieldStorage(object, field));
-}
-// Records that an optional field now holds a value (sets its flag byte when it has one; a
-// flagless reference field is present through its non-null reference).
-inline void MarkFieldPresent(SarnObject* object, const FieldInfo& field) {
-  if (field.flagOffset != 0) reinterpret_cast<unsigned char*>(object)[field.flagOffset] = 1;
-}
 
 }  // namespace sarn

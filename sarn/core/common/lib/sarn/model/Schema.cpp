@@ -1,10 +1,9 @@
 // The shared field-selection rules. The tables themselves are generated (build tree); this file
-// only reads them, so every walker applies the same version, history, presence and enum rules.
+// only reads them, so every walker applies the same version, history and enum rules.
 #include "sarn/model/Schema.h"
 
 #include <cstring>
 
-#include "sarn/model/SarnObject.h"
 
 namespace sarn {
 
@@ -33,21 +32,6 @@ const FieldInfo* FieldForVersion(const StructInfo* info, unsigned n, KernoVersio
     }
   }
   return FieldTakesPart(current, version) ? &current : nullptr;
-}
-
-bool IsFieldPresent(const SarnObject* object, const FieldInfo& field) {
-  switch (field.arity) {
-    case SARN_ARITY_NONE:
-      return false;
-    case SARN_ARITY_OPTIONAL:
-      if (field.flagOffset != 0) {
-        return reinterpret_cast<const unsigned char*>(object)[field.flagOffset] != 0;
-      }
-      // Flagless optional fields are the reference kinds: presence is a non-null pointer.
-      return FieldRef<const void*>(object, field) != nullptr;
-    default:
-      return true;
-  }
 }
 
 const char* EnumNumberName(long enumId, uint64_t number) {

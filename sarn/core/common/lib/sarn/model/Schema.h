@@ -149,35 +149,30 @@ class SARN_EXPORT Schema {
   static const int nEnumTypeG;
 };
 
-// The rules every walker shares.
+// The rules every walker shares (presence of optional fields: FieldAccess.h).
 
 // The StructInfo of type id `id`, or null when the id is outside the table or names no type.
 SARN_EXPORT const StructInfo* StructInfoForId(long id);
 // The EnumDef of enum id `id`, or null.
 SARN_EXPORT const EnumDef* EnumDefForId(long id);
 
-// Rule A: the record takes part at `version` when its arity is not NONE and version is 0 or
+// The record takes part at `version` when its arity is not NONE and version is 0 or
 // within [minVersion, maxVersion].
 inline bool FieldTakesPart(const FieldInfo& field, KernoVersion version) {
   if (field.arity == SARN_ARITY_NONE) return false;
   return version == 0 || (field.minVersion <= version && version <= field.maxVersion);
 }
 
-// Rule B (Dictionary converter): the record describing field `n` of `info` at `version`: at
+// The record describing field `n` of `info` at `version`: at
 // version 0 the current record; otherwise the first older record whose range holds `version`,
 // else the current record if its own range holds it. Null when the field does not take part
 // (arity NONE, out of range, or n beyond the table).
 SARN_EXPORT const FieldInfo* FieldForVersion(const StructInfo* info, unsigned n, KernoVersion version);
 
-// Rule C, generalised to every arity: NONE is never present; REQUIRED and MULTI always are; an
-// OPTIONAL field is present when its flag byte is non-zero, or, without a flag byte, when the
-// reference at valueOffset is non-null.
-SARN_EXPORT bool IsFieldPresent(const SarnObject* object, const FieldInfo& field);
-
-// Rule E: the name of number `number` in enum `enumId`, or null when the enum or the number has
+// The name of number `number` in enum `enumId`, or null when the enum or the number has
 // none. The returned text is the metadata's own constant.
 SARN_EXPORT const char* EnumNumberName(long enumId, uint64_t number);
-// Rule E reversed: the index of the first non-null name equal to `name`. False (and `number`
+// The reverse: the index of the first non-null name equal to `name`. False (and `number`
 // untouched) when there is none.
 SARN_EXPORT bool EnumNameNumber(long enumId, const char* name, unsigned int& number);
 

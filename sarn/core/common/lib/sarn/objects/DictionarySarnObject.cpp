@@ -1,9 +1,9 @@
 // Objects to Dictionary trees and back.
 //
-// Object to Dictionary runs one loop over an explicit stack: an object frame walks a field table,
-// an array frame the elements of a multi-valued field of objects. Each nested dictionary is added
-// to its parent (or the parent's array) as soon as it is made and filled afterwards, which gives
-// the same tree as converting the child first, since values are shared by reference.
+// Object to Dictionary is the Dictionary side of the shared object walk: each nested dictionary
+// is added to its parent (or the parent's array) as soon as it is made and filled afterwards,
+// which gives the same tree as converting the child first, since values are shared by reference.
+// Value texts come from the shared FormatFieldText, so they are the JSON writer's texts.
 //
 // Dictionary to object recurses once per nested dictionary, and the recursion is bounded: the
 // depth (counted like the JSON readers count containers: the top dictionary is 1, an array or a
@@ -21,21 +21,12 @@
 #include "sarn/model/SarnHashTable.h"
 #include "sarn/values/ScalarTypes.h"
 #include "sarn/model/StructInfoMap.h"
+#include "sarn/model/internal/ObjectWalk.h"
 #include "sarn/objects/internal/ObjectText.h"
-#include "sarn/values/internal/TimeText.h"
-#include "sarn/base/internal/WalkStack.h"
 
 namespace sarn {
 
-static_assert(sizeof(ChannelNumber) == 8 && sizeof(Currency) == 8 && sizeof(DateTime) == 8 && sizeof(Date) == 4 &&
-                  sizeof(Time) == 4,
-              "scalar value types have the widths the object layout gives them");
-
 namespace {
-
-bool HoldsObjects(unsigned dataType) {
-  return dataType == SARN_DATA_TYPE_KNOWN_DICT || dataType == SARN_DATA_TYPE_SUBDICT;
-}
 
 void Append(VekMempool* pool, VekString& error, const char* piece) {
   error = VekString::Format(pool, "%s%s", error.Utf8(), piece);
@@ -49,26 +40,109 @@ void Replace(VekMempool* pool, VekString& error, const char* message) {
   error = VekString::FromUtf8Bytes(pool, std::strlen(message), message);
 }
 
-ref<DictValue> Quoted(VekMempool* pool, const VekString& text) { return MempoolNew<StringValue>(pool, text); }
+// A store into an object fails only for lack of memory: a source array holds no more elements
+// than a field's array can.
+bool Stored(bool isStored, VekMempool* pool, VekString& error) {
+  if (!isStored) Append(pool, error, kOutOfMemoryMessage);
+  return isStored;
+}
 
 const VekString& CachedName(VekMempool* pool, const char* name) { return *GetGlobalName(pool, name); }
 
-}  // namespace
-
-struct DictionarySarnObject::Frame {
-  const SarnObject* pObjectM;
-  const StructInfo* pInfoM;
-  Dictionary* pDictionaryM;   // the dictionary being filled (array frame: the one holding the array)
-  const FieldInfo* pFieldM;   // array frame only: the multi-valued field of objects
-  const VekString* pNameM;    // array frame only: its name
-  ArrayValue* pArrayM;        // array frame only: made at the first element
-  KernoVersion versionM;
-  unsigned nextM;             // next field number, or next element
+// Per object: the dictionary being filled, and the key and array of the field being visited.
+struct DictionaryFrameData {
+  Dictionary* pDictionaryM;
+  const VekString* pKeyM;
+  ArrayValue* pArrayM;
 };
 
-class DictionarySarnObject::FrameStack : public internal::WalkStack<DictionarySarnObject::Frame> {
+}  // namespace
+
+class DictionarySarnObject::Builder {
  public:
-  using WalkStack::WalkStack;
+  using FrameData = DictionaryFrameData;
+  using Walk = internal::ObjectWalk<Builder>;
+  using Frame = Walk::Frame;
+  using Child = Walk::Child;
+
+  explicit Builder(DictionarySarnObject& converter)
+      : converterM(converter),
+        walkM(converter.pMempoolM, converter.structDefsM, static_cast<uint32_t>(converter.structDefCountM),
+              internal::WalkVersions::OLDER_RECORDS) {}
+
+  Walk& GetWalk() { return walkM; }
+  ref<Dictionary>& Result() { return resultM; }
+
+  // Memory that runs out anywhere fails the whole conversion (a null result, never a tree with a
+  // value missing): the hooks that cannot stop the walk note it, and the next value stops it.
+  bool WasOutOfMemory() const { return wasOutOfMemoryM; }
+
+  void BeginObject(Frame& frame, Frame* parent) {
+    VekMempool* pool = converterM.pMempoolM;
+    ref<Dictionary> dictionary =
+        Dictionary::New(pool, frame.pInfoM != nullptr ? CachedName(pool, frame.pInfoM->pName) : VekString());
+    frame.dataM.pDictionaryM = dictionary.Get();
+    if (!dictionary) {
+      wasOutOfMemoryM = true;
+    } else if (parent == nullptr) {
+      resultM = dictionary;
+    } else if (!Put(*parent, dictionary)) {
+      // The parent did not take it, so it is gone when `dictionary` goes: nothing may fill it.
+      frame.dataM.pDictionaryM = nullptr;
+    }
+  }
+
+  void BeginField(Frame& frame) {
+    VekMempool* pool = converterM.pMempoolM;
+    if (frame.pNameM != nullptr) frame.dataM.pKeyM = &CachedName(pool, frame.pNameM);
+    frame.dataM.pArrayM = nullptr;
+    if (frame.pFieldM->arity == SARN_ARITY_MULTI && !wasOutOfMemoryM) {
+      // The walk reports only fields with a value to add, so the array is never left empty.
+      ref<ArrayValue> array = new (pool) ArrayValue();
+      if (!array || !frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, array)) {
+        wasOutOfMemoryM = true;
+        return;
+      }
+      frame.dataM.pArrayM = array.Get();
+    }
+  }
+
+  bool Value(Frame& frame, unsigned i, Child& child) {
+    if (wasOutOfMemoryM) return false;
+    const FieldInfo& field = *frame.pFieldM;
+    if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
+      child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
+      child.versionM = frame.versionM;
+      return true;
+    }
+    ref<DictValue> value = converterM.MakeValue(field, frame.pObjectM, i);
+    if (value == nullptr) {
+      // The walk passes over null references; of the rest only a free-form dictionary without a
+      // tree has nothing to add. Any other null is memory that ran out.
+      if (field.dataType == SARN_DATA_TYPE_ANY_DICT) return true;
+      wasOutOfMemoryM = true;
+      return false;
+    }
+    return Put(frame, value);
+  }
+
+  void EndField(Frame&) {}
+  void EndObject(Frame&) {}
+
+ private:
+  // Adds `value` for the field `frame` is visiting: to its array, or under its key; false (and
+  // noted) when memory ran out.
+  bool Put(Frame& frame, const ref<DictValue>& value) {
+    bool isAdded = frame.dataM.pArrayM != nullptr ? frame.dataM.pArrayM->Add(value)
+                                                   : frame.dataM.pDictionaryM->Add(*frame.dataM.pKeyM, value);
+    if (!isAdded) wasOutOfMemoryM = true;
+    return isAdded;
+  }
+
+  DictionarySarnObject& converterM;
+  Walk walkM;
+  ref<Dictionary> resultM;
+  bool wasOutOfMemoryM = false;
 };
 
 DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* const* structDefs, int count)
@@ -77,195 +151,59 @@ DictionarySarnObject::DictionarySarnObject(VekMempool* pool, const StructInfo* c
 // ---- object to Dictionary ----
 
 ref<Dictionary> DictionarySarnObject::SarnObjectToDictionary(const SarnObject* object, KernoVersion version) {
-  FrameStack stack(pMempoolM);
-  ref<Dictionary> result = PushObject(stack, object, version);
-  Walk(stack);
-  return result;
+  Builder builder(*this);
+  bool isWalked = builder.GetWalk().Run(builder, object, version, DictionaryFrameData());
+  if (!isWalked || builder.WasOutOfMemory()) return ref<Dictionary>();
+  return builder.Result();
 }
 
-ref<Dictionary> DictionarySarnObject::PushObject(FrameStack& stack, const SarnObject* object, KernoVersion version) {
-  unsigned id = object->typeIdM;
-  const StructInfo* info = id < static_cast<unsigned>(structDefCountM) ? structDefsM[id] : nullptr;
-  if (info == nullptr) return Dictionary::New(pMempoolM, VekString());
-  ref<Dictionary> dictionary = Dictionary::New(pMempoolM, CachedName(pMempoolM, info->pName));
-  Frame& frame = stack.Push();
-  frame.pObjectM = object;
-  frame.pInfoM = info;
-  frame.pDictionaryM = dictionary.Get();
-  frame.versionM = version;
-  return dictionary;
-}
-
-void DictionarySarnObject::Walk(FrameStack& stack) {
-  while (!stack.Empty()) {
-    Frame& frame = stack.Top();
-    if (frame.pFieldM != nullptr) {
-      const FieldInfo& field = *frame.pFieldM;
-      unsigned count = FieldAccess::Count(frame.pObjectM, field);
-      const SarnObject* child = nullptr;
-      while (frame.nextM < count && child == nullptr) {
-        child = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, frame.nextM++));
-      }
-      if (child == nullptr) {
-        stack.Pop();
-        continue;
-      }
-      if (frame.pArrayM == nullptr) {
-        ref<ArrayValue> array = new (pMempoolM) ArrayValue();
-        frame.pDictionaryM->Add(*frame.pNameM, array);
-        frame.pArrayM = array.Get();
-      }
-      ArrayValue* array = frame.pArrayM;
-      array->Add(PushObject(stack, child, frame.versionM));
-      continue;
-    }
-
-    const StructInfo* info = frame.pInfoM;
-    if (frame.nextM == info->nFieldInfo) {
-      stack.Pop();
-      continue;
-    }
-    const FieldInfo* field = FieldForVersion(info, frame.nextM++, frame.versionM);
-    if (field == nullptr) continue;
-    const SarnObject* object = frame.pObjectM;
-    const VekString& name = CachedName(pMempoolM, FieldName(info, *field));
-    if (field->arity == SARN_ARITY_MULTI) {
-      if (HoldsObjects(field->dataType)) {
-        Frame parent = frame;
-        Frame& array = stack.Push();
-        array.pObjectM = object;
-        array.pDictionaryM = parent.pDictionaryM;
-        array.pFieldM = field;
-        array.pNameM = &name;
-        array.versionM = parent.versionM;
-      } else {
-        ref<Dictionary> dictionary = frame.pDictionaryM;
-        MultiFieldToDict(name, field, object, dictionary, frame.versionM);
-      }
-      continue;
-    }
-    if (field->arity == SARN_ARITY_OPTIONAL && !IsFieldPresent(object, *field)) continue;
-    if (HoldsObjects(field->dataType)) {
-      const SarnObject* child = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(object, *field, 0));
-      if (child == nullptr) continue;
-      Dictionary* parent = frame.pDictionaryM;
-      parent->Add(name, PushObject(stack, child, frame.versionM));
-    } else {
-      ref<Dictionary> dictionary = frame.pDictionaryM;
-      SingleFieldToDict(name, field, object, dictionary, frame.versionM);
-    }
-  }
-}
-
+// Both run the walk over the one field, adding to `dictionary` under `name`.
 void DictionarySarnObject::SingleFieldToDict(const VekString& name, const FieldInfo* field, const SarnObject* object,
                                              ref<Dictionary>& dictionary, KernoVersion version) {
-  ref<DictValue> value;
-  if (HoldsObjects(field->dataType)) {
-    const SarnObject* child = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(object, *field, 0));
-    if (child != nullptr) value = SarnObjectToDictionary(child, version);
-  } else {
-    value = MakeValue(*field, object, 0);
-  }
-  if (value != nullptr) dictionary->Add(name, value);
+  Builder builder(*this);
+  DictionaryFrameData data = {dictionary.Get(), &name, nullptr};
+  builder.GetWalk().RunField(builder, object, *field, nullptr, version, data);
 }
 
 void DictionarySarnObject::MultiFieldToDict(const VekString& name, const FieldInfo* field, const SarnObject* object,
                                             ref<Dictionary>& dictionary, KernoVersion version) {
-  ref<ArrayValue> array = new (pMempoolM) ArrayValue();
-  unsigned count = FieldAccess::Count(object, *field);
-  for (unsigned i = 0; i < count; ++i) {
-    ref<DictValue> value;
-    if (HoldsObjects(field->dataType)) {
-      const SarnObject* child = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(object, *field, i));
-      if (child != nullptr) value = SarnObjectToDictionary(child, version);
-    } else {
-      value = MakeValue(*field, object, i);
-    }
-    if (value != nullptr) array->Add(value);
-  }
-  if (array->CountValues() != 0) dictionary->Add(name, array);
+  SingleFieldToDict(name, field, object, dictionary, version);
 }
 
+// A value of a field with a text form, quoted as in JSON except FLOAT, which a dictionary keeps
+// bare (its writer still quotes a float whose text is not a bare token); a free-form dictionary
+// shared; a lazy payload wrapped, not converted.
 ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const SarnObject* object, unsigned i) {
   VekMempool* pool = pMempoolM;
+  const DataTypeTraits& traits = TraitsOf(field.dataType);
+  if (traits.fHasText) {
+    internal::FieldText text;
+    internal::FormatFieldText(pool, structDefsM, static_cast<uint32_t>(structDefCountM), field, object, i, text);
+    if (text.isFailedM) return nullptr;
+    ref<StringValue> value;
+    if (text.pStringM != nullptr) {
+      value = new (pool) StringValue(*text.pStringM);
+    } else if (text.isNameM) {
+      value = new (pool) StringValue(CachedName(pool, text.pBytesM));
+    } else {
+      VekString copy = VekString::FromUtf8Bytes(pool, text.nLengthM, text.pBytesM);
+      if (copy.FEmpty() && text.nLengthM != 0) return nullptr;
+      value = new (pool) StringValue(copy);
+    }
+    if (value == nullptr) return nullptr;
+    value->needQuotesM = traits.fQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
+    return value;
+  }
+  VekCore* reference = FieldAccess::ReferenceAt(object, field, i);
+  if (reference == nullptr) return nullptr;
   switch (field.dataType) {
-    case SARN_DATA_TYPE_BOOL:
-      return StringValue::Make(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0, pool);
-    case SARN_DATA_TYPE_BYTESTRING: {
-      // A missing byte string reads as an empty one.
-      ref<vek::ByteBuffer> bytes = static_cast<vek::ByteBuffer*>(FieldAccess::ReferenceAt(object, field, i));
-      if (bytes == nullptr) return Quoted(pool, VekString());
-      return StringValue::Make(bytes, pool);
-    }
-    case SARN_DATA_TYPE_CHANNEL_NUMBER:
-      return Quoted(pool, FieldAccess::ScalarValue<ChannelNumber>(object, field, i).ToString());
-    case SARN_DATA_TYPE_CURRENCY:
-      return Quoted(pool, FieldAccess::ScalarValue<Currency>(object, field, i).ToString());
-    case SARN_DATA_TYPE_DATE: {
-      Date date = FieldAccess::ScalarValue<Date>(object, field, i);
-      char text[10];
-      if (!internal::FormatDateText(date.daysM, text)) return Quoted(pool, date.ToString());
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
-    }
-    case SARN_DATA_TYPE_DATETIME: {
-      DateTime dateTime = FieldAccess::ScalarValue<DateTime>(object, field, i);
-      char text[19];
-      if (!internal::FormatDateTimeText(dateTime.millisecondsM / 1000, text)) return Quoted(pool, dateTime.ToString());
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
-    }
-    case SARN_DATA_TYPE_TIME: {
-      int64_t seconds = FieldAccess::ScalarValue<Time>(object, field, i).millisecondsM / 1000;
-      char text[8];
-      internal::FormatTimeOfDayText(seconds - internal::FloorDiv(seconds, 86400) * 86400, text);
-      return Quoted(pool, VekString::FromUtf8Bytes(pool, sizeof text, text));
-    }
-    case SARN_DATA_TYPE_ANY_DICT: {
-      const Dict* dict = static_cast<const Dict*>(FieldAccess::ReferenceAt(object, field, i));
-      if (dict == nullptr) return nullptr;
-      return dict->GetDictionary();
-    }
-    case SARN_DATA_TYPE_ENUM:
-      return Quoted(pool, EnumToString(field, FieldAccess::ScalarValue<uint32_t>(object, field, i)));
-    case SARN_DATA_TYPE_FLOAT:
-      return StringValue::Make(FieldAccess::ScalarValue<double>(object, field, i), pool);
-    case SARN_DATA_TYPE_INT_ID:
-    case SARN_DATA_TYPE_LONG_ID:
-    case SARN_DATA_TYPE_STRING_ID:
-      return Quoted(pool, IdToString(field, object, i));
-    case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
-      LazyDict* lazy = static_cast<LazyDict*>(FieldAccess::ReferenceAt(object, field, i));
-      if (lazy == nullptr) return nullptr;
-      return MempoolNew<LazyDictValue>(pool, ref<LazyDict>(lazy));
-    }
-    case SARN_DATA_TYPE_S64:
-      return StringValue::Make(static_cast<long long>(FieldAccess::ScalarValue<int64_t>(object, field, i)), pool);
-    case SARN_DATA_TYPE_S32:
-      return StringValue::Make(static_cast<int>(FieldAccess::ScalarValue<int32_t>(object, field, i)), pool);
-    case SARN_DATA_TYPE_STRING:
-      return Quoted(pool, FieldAccess::StringAt(object, field, i));
-    case SARN_DATA_TYPE_U32:
-      return StringValue::Make(static_cast<unsigned int>(FieldAccess::ScalarValue<uint32_t>(object, field, i)), pool);
-    case SARN_DATA_TYPE_U64:
-      return StringValue::Make(
-          static_cast<unsigned long long>(FieldAccess::ScalarValue<uint64_t>(object, field, i)), pool);
+    case SARN_DATA_TYPE_ANY_DICT:
+      return static_cast<const Dict*>(reference)->GetDictionary();
+    case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY:
+      return MempoolNew<LazyDictValue>(pool, ref<LazyDict>(static_cast<LazyDict*>(reference)));
     default:
       return nullptr;
   }
-}
-
-VekString DictionarySarnObject::EnumToString(const FieldInfo& field, uint32_t value) {
-  const char* name = internal::EnumText(field, value);
-  if (name != nullptr) return CachedName(pMempoolM, name);
-  char text[32];
-  size_t length = internal::FormatInvalidEnum(value, text);
-  return VekString::FromUtf8Bytes(pMempoolM, length, text);
-}
-
-VekString DictionarySarnObject::IdToString(const FieldInfo& field, const SarnObject* object, unsigned i) {
-  char text[internal::kIdTextRoom];
-  size_t length = internal::FormatIdText(pMempoolM, structDefsM, static_cast<uint32_t>(structDefCountM), field,
-                                         object, i, text);
-  return VekString::FromUtf8Bytes(pMempoolM, length, text);
 }
 
 // ---- Dictionary to object ----
@@ -305,6 +243,7 @@ bool DictionarySarnObject::DictionaryToSarnObject(const ref<Dictionary>& diction
     return false;
   }
   ref<SarnObject> object = info->pFactory(pool);
+  if (!object) return Stored(false, pool, error);
   object->SetDebugLockOwner(0);
 
   struct DepthGuard {
@@ -431,67 +370,67 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
       bool parsed;
       if (!string->GetValue(parsed)) break;
       uint8_t stored = parsed ? 1 : 0;
-      return FieldAccess::PutScalar(object, field, &stored);
+      return Stored(FieldAccess::PutScalar(object, field, &stored), pool, error);
     }
     case SARN_DATA_TYPE_BYTESTRING: {
       ref<vek::ByteBuffer> bytes;
-      string->GetValue(bytes);
-      return FieldAccess::PutReference(object, field, bytes.Get());
+      if (!string->GetValue(bytes)) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, bytes.Get()), pool, error);
     }
     case SARN_DATA_TYPE_CHANNEL_NUMBER: {
       ChannelNumber parsed = ChannelNumber::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_CURRENCY: {
       Currency parsed = Currency::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATE: {
       Date parsed = Date::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_DATETIME: {
       DateTime parsed = DateTime::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_TIME: {
       Time parsed = Time::Parse(string->GetValue());
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_FLOAT: {
       double parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S64: {
       long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_S32: {
       int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U32: {
       unsigned int parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_U64: {
       unsigned long long parsed;
       if (!string->GetValue(parsed)) break;
-      return FieldAccess::PutScalar(object, field, &parsed);
+      return Stored(FieldAccess::PutScalar(object, field, &parsed), pool, error);
     }
     case SARN_DATA_TYPE_STRING:
-      return FieldAccess::PutString(object, field, string->GetValue());
+      return Stored(FieldAccess::PutString(object, field, string->GetValue()), pool, error);
     case SARN_DATA_TYPE_ENUM: {
       uint32_t number;
       if (!StringToEnum(field, string->GetValue(), error, number)) {
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &number);
+      return Stored(FieldAccess::PutScalar(object, field, &number), pool, error);
     }
     case SARN_DATA_TYPE_INT_ID: {
       unsigned int id;
@@ -499,7 +438,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_LONG_ID: {
       unsigned long long id;
@@ -507,7 +446,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutScalar(object, field, &id);
+      return Stored(FieldAccess::PutScalar(object, field, &id), pool, error);
     }
     case SARN_DATA_TYPE_STRING_ID: {
       VekString id;
@@ -515,7 +454,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, badItem);
         return false;
       }
-      return FieldAccess::PutString(object, field, id);
+      return Stored(FieldAccess::PutString(object, field, id), pool, error);
     }
     case SARN_DATA_TYPE_ANY_DICT: {
       if (value->kindM != DictValue::KIND_DICTIONARY) {
@@ -523,7 +462,8 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         return false;
       }
       ref<Dict> dict = MempoolNew<Dict>(pool, ref<Dictionary>(static_cast<Dictionary*>(value.Get())));
-      return FieldAccess::PutReference(object, field, dict.Get());
+      if (!dict) return Stored(false, pool, error);
+      return Stored(FieldAccess::PutReference(object, field, dict.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT:
     case SARN_DATA_TYPE_SUBDICT: {
@@ -536,12 +476,12 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
         Append(pool, error, fMulti ? " Can't convert inner Dictionary to SarnObject" : ". Can't unmarshal inner Dictionary");
         return false;
       }
-      return FieldAccess::PutReference(object, field, inner.Get());
+      return Stored(FieldAccess::PutReference(object, field, inner.Get()), pool, error);
     }
     case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
       ref<LazyDict> lazy;
       if (!DictValueToLazyDict(value, lazy, error, pool, version)) return false;
-      return FieldAccess::PutReference(object, field, lazy.Get());
+      return Stored(FieldAccess::PutReference(object, field, lazy.Get()), pool, error);
     }
     default: {
       char code[16];
@@ -617,6 +557,10 @@ bool DictionarySarnObject::StringToStringId(VekMempool* pool, const FieldInfo* f
     return false;
   }
   out = skip == 0 ? text : VekString::FromUtf8Bytes(pool, text.NByte() - skip, text.Utf8() + skip);
+  if (out.FEmpty() && text.NByte() != skip) {
+    Append(pool, error, kOutOfMemoryMessage);
+    return false;
+  }
   return true;
 }
 

@@ -5,8 +5,9 @@
 // present field under its name; scalars become StringValues (BOOL, S32, U32 and FLOAT bare, the
 // rest quoted), nested objects nested dictionaries, multi-valued fields ArrayValues (empty ones
 // and null references are left out); free-form dictionaries and lazy payloads are shared, not
-// copied. This direction cannot fail, and it walks nested objects with an explicit stack, so any
-// depth is converted.
+// copied. This direction fails only when memory runs out (the result is then null, never a tree
+// with a value missing), and it walks nested objects with an explicit stack, so any depth is
+// converted.
 //
 // Dictionary to object: the first "type" value names the type; each field of the type is read
 // from the first value under its name; names that are not fields are ignored. Failures return
@@ -72,20 +73,15 @@ class SARN_EXPORT DictionarySarnObject {
   int structDefCountM;
 
  private:
-  struct Frame;
-  class FrameStack;
+  // The Dictionary side of the shared object walk (model/internal/ObjectWalk.h).
+  class Builder;
 
   // Value `i` of a field whose values are not schema objects, as a dictionary value; null when it
   // is left out.
   ref<DictValue> MakeValue(const FieldInfo& field, const SarnObject* object, unsigned i);
-  // A new dictionary for `object` (holding its "type"), with a frame on the stack to fill it.
-  ref<Dictionary> PushObject(FrameStack& stack, const SarnObject* object, KernoVersion version);
-  void Walk(FrameStack& stack);
 
   bool ReadValue(const FieldInfo& field, const ref<DictValue>& value, SarnObject* object, VekString& error,
                  KernoVersion version, bool fMulti);
-  VekString EnumToString(const FieldInfo& field, uint32_t value);
-  VekString IdToString(const FieldInfo& field, const SarnObject* object, unsigned i);
   bool StringToEnum(const FieldInfo& field, const VekString& text, VekString& error, uint32_t& value);
   static bool SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const VekString& text, VekString& error,
                            size_t& prefixLength);

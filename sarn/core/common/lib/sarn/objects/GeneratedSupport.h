@@ -30,15 +30,12 @@
 namespace sarn {
 
 // The body of every generated Factory: the object in `pool` (the platform's counted new records
-// the pool), with its first reference. A pool that cannot supply the bytes gives null rather than
-// an exception.
+// the pool), with its first reference. Null when the pool cannot supply the bytes: the counted new
+// does not throw, and a generated constructor allocates nothing (its arrays take storage on
+// their first Add).
 template <class T>
 ref<SarnObject> NewSchemaObject(VekMempool* pool) {
-  try {
-    return ref<SarnObject>(new (pool) T());
-  } catch (const std::bad_alloc&) {
-    return ref<SarnObject>();
-  }
+  return ref<SarnObject>(new (pool) T());
 }
 
 }  // namespace sarn

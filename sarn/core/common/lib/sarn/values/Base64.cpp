@@ -77,12 +77,17 @@ bool DecodeInto(const unsigned char* decode, unsigned char terminator, const uns
 }
 
 // Decodes with the given tables into a new byte string; null when the text does not decode.
+// Null when the text does not decode or when memory runs out (`isOutOfMemory` then says so).
 ref<vek::ByteBuffer> DecodeToByteString(VekMempool* pool, const unsigned char* decode, unsigned char terminator,
-                                        const unsigned char* text, size_t n) {
+                                        const unsigned char* text, size_t n, bool& isOutOfMemory) {
+  isOutOfMemory = false;
   if (n % 4 != 0) return ref<vek::ByteBuffer>();
   unsigned char* data;
   ref<internal::SizedByteString> bytes = internal::NewSizedByteString(pool, n / 4 * 3, data);
-  if (!bytes) return ref<vek::ByteBuffer>();
+  if (!bytes) {
+    isOutOfMemory = true;
+    return ref<vek::ByteBuffer>();
+  }
   if (n == 0) return bytes;
   size_t nOut = 0;
   if (!DecodeInto(decode, terminator, text, n, data, nOut)) return ref<vek::ByteBuffer>();
@@ -209,8 +214,10 @@ void Base64::Encode(VekMempool* pool, const ref<vek::ByteBuffer>& input, ref<vek
 
 bool Base64::Decode(VekMempool* pool, const ref<vek::ByteBuffer>& input, ref<vek::ByteBuffer>& output) const {
   if (fBadCodeSetM) return false;
-  ref<vek::ByteBuffer> bytes = input ? DecodeToByteString(pool, decodeM, terminatorM, input->GetData(), input->GetLength())
-                                     : DecodeToByteString(pool, decodeM, terminatorM, nullptr, 0);
+  bool isOutOfMemory;
+  ref<vek::ByteBuffer> bytes =
+      input ? DecodeToByteString(pool, decodeM, terminatorM, input->GetData(), input->GetLength(), isOutOfMemory)
+            : DecodeToByteString(pool, decodeM, terminatorM, nullptr, 0, isOutOfMemory);
   if (!bytes) return false;
   output = bytes;
   return true;
@@ -228,8 +235,11 @@ VekString EncodeBase64(VekMempool* pool, const ref<vek::ByteBuffer>& bytes) {
 
 ref<vek::ByteBuffer> DecodeBase64(VekMempool* pool, const VekString& text) {
   const Base64& codec = DefaultCodec();
-  ref<vek::ByteBuffer> bytes = DecodeToByteString(pool, codec.decodeM, codec.terminatorM, BytesOf(text), text.NByte());
-  return bytes ? bytes : vek::ByteBuffer::New(pool);
+  bool isOutOfMemory;
+  ref<vek::ByteBuffer> bytes =
+      DecodeToByteString(pool, codec.decodeM, codec.terminatorM, BytesOf(text), text.NByte(), isOutOfMemory);
+  if (bytes || isOutOfMemory) return bytes;
+  return vek::ByteBuffer::New(pool);
 }
 
 VekString FormatBytes(VekMempool* pool, const VekString& bytes) { return FormatHex(pool, BytesOf(bytes), bytes.NByte()); }

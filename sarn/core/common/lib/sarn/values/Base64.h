@@ -45,8 +45,8 @@ class SARN_EXPORT Base64 {
 
 // The default codec's text of `bytes` (null counts as empty).
 SARN_EXPORT VekString EncodeBase64(VekMempool* pool, const ref<vek::ByteBuffer>& bytes);
-// The default codec's bytes of `text`: never null; a text that does not decode gives an empty
-// byte string, as does the empty text.
+// The default codec's bytes of `text`: a text that does not decode gives an empty byte string,
+// as does the empty text. Null only when memory runs out.
 SARN_EXPORT ref<vek::ByteBuffer> DecodeBase64(VekMempool* pool, const VekString& text);
 
 // "%02X " for every byte, the space also after the last one.

@@ -4,16 +4,28 @@
 
 namespace sarn {
 
-Vek1ByteBuffer::Vek1ByteBuffer(VekMempool* pool) : bytesM(new (pool) VekByteString()), nUsedM(0) {}
+Vek1ByteBuffer::Vek1ByteBuffer(VekMempool* pool)
+    : bytesM(new (pool) VekByteString()), nUsedM(0), pMempoolM(pool), isFailedM(false) {}
 
 Vek1ByteBuffer::~Vek1ByteBuffer() {}
 
 bool Vek1ByteBuffer::Grow(unsigned long n) {
-  unsigned long capacity = bytesM->GetLength();
+  if (isFailedM) return false;
+  unsigned long capacity = Capacity();
   unsigned long extra = capacity / 5 > 256 ? capacity / 5 : 256;
   // The sum must not wrap: a wrapped capacity would be smaller than what is appended.
   if (n > ULONG_MAX - capacity - extra) return false;
-  return bytesM->SetLength(capacity + n + extra);
+  if (!bytesM) bytesM = new (pMempoolM) VekByteString();
+  if (bytesM && bytesM->SetLength(capacity + n + extra)) return true;
+  Fail();
+  return false;
+}
+
+void Vek1ByteBuffer::Fail() {
+  // Keeping the bytes would let a later, smaller append succeed behind the missing piece.
+  isFailedM = true;
+  bytesM = nullptr;
+  nUsedM = 0;
 }
 
 ByteBuffer::~ByteBuffer() {}

@@ -14,6 +14,11 @@
 //
 // Ownership and pools: a buffer's bytes live in the pool given to its constructor and are
 // released by its destructor. GetData() stays valid until the next append.
+//
+// Out of memory: an append that cannot grow the storage fails the buffer for good. It drops
+// what it held (GetLength() 0, GetData() null) and refuses every later append, so a writer that
+// goes on appending after a failure never leaves a text with a piece missing in the middle;
+// HasFailed() tells the writer's caller.
 // Thread safety: none; one thread at a time per buffer.
 #pragma once
 
@@ -33,10 +38,10 @@ class SARN_EXPORT Vek1ByteBuffer {
   Vek1ByteBuffer(const Vek1ByteBuffer&) = delete;
   Vek1ByteBuffer& operator=(const Vek1ByteBuffer&) = delete;
 
-  // Each append returns false, appending nothing, when the storage cannot grow (out of memory
-  // or a total length the platform cannot hold).
+  // Each append returns false, appending nothing, when the storage cannot grow (a total length
+  // the platform cannot hold); when memory runs out it also fails the buffer (see above).
   bool AppendByte(unsigned char byte) {
-    if (1 >= bytesM->GetLength() - nUsedM && !Grow(1)) return false;
+    if (1 >= Capacity() - nUsedM && !Grow(1)) return false;
     bytesM->GetData()[nUsedM++] = byte;
     return true;
   }
@@ -45,7 +50,7 @@ class SARN_EXPORT Vek1ByteBuffer {
     if (length > static_cast<unsigned long>(PTRDIFF_MAX)) return false;
     // Written as a difference so that a huge `length` cannot wrap the test (the capacity is
     // never below nUsedM).
-    if (length >= bytesM->GetLength() - nUsedM && !Grow(length)) return false;
+    if (length >= Capacity() - nUsedM && !Grow(length)) return false;
     std::memcpy(bytesM->GetData() + nUsedM, data, length);
     nUsedM += length;
     return true;
@@ -54,18 +59,26 @@ class SARN_EXPORT Vek1ByteBuffer {
   // that a writer that knows its output size grows once instead of step by step.
   bool Reserve(unsigned long length) {
     if (length > static_cast<unsigned long>(PTRDIFF_MAX)) return false;
-    return length < bytesM->GetLength() - nUsedM || Grow(length);
+    return length < Capacity() - nUsedM || Grow(length);
   }
-  // Null while nothing was ever appended.
-  const unsigned char* GetData() const { return bytesM->GetData(); }
+  // Null while nothing was ever appended, and after a failure.
+  const unsigned char* GetData() const { return bytesM ? bytesM->GetData() : nullptr; }
   unsigned long GetLength() const { return static_cast<unsigned long>(nUsedM); }
+  // True once an append ran out of memory; the buffer is then empty for good.
+  bool HasFailed() const { return isFailedM; }
+  // Fails the buffer as an append that runs out of memory does: for a writer whose piece of
+  // text could not be made.
+  void Fail();
 
-  ref<VekByteString> bytesM;  // its length is the capacity
+  ref<VekByteString> bytesM;  // its length is the capacity; null when it could not be made
   uint64_t nUsedM;            // bytes appended: the first nUsedM bytes of bytesM
 
  private:
+  unsigned long Capacity() const { return bytesM ? bytesM->GetLength() : 0; }
   // Sets the capacity to c + n + max(c / 5, 256) for the current capacity c.
   bool Grow(unsigned long n);
+  VekMempool* pMempoolM;  // where bytesM is made again when it could not be made at first
+  bool isFailedM;
 };
 
 class SARN_EXPORT ByteBuffer {
@@ -84,6 +97,9 @@ class SARN_EXPORT ByteBuffer {
   bool Reserve(unsigned long length) { return bufferM.Reserve(length); }
   const unsigned char* GetData() const { return bufferM.GetData(); }
   unsigned long GetLength() const { return bufferM.GetLength(); }
+  // True once an append ran out of memory: what was written is lost and the writer failed.
+  bool HasFailed() const { return bufferM.HasFailed(); }
+  void Fail() { bufferM.Fail(); }
 
   Vek1ByteBuffer bufferM;
 };

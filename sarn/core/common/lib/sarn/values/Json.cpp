@@ -321,8 +321,9 @@ bool JsonToString(VekMempool* mempool, VekHashStringToStringNew* internTable, In
   if (p == end || *p != '"') {
     const unsigned char* start = p;
     while (p != end && kBareTokenG.vM[*p]) ++p;
-    input.pCurM = p;
     result = MakeResult(mempool, internTable, start, static_cast<size_t>(p - start));
+    if (result.FEmpty() && p != start) return false;  // out of memory: the cursor stays at the start
+    input.pCurM = p;
     return true;
   }
   const unsigned char* start = ++p;
@@ -351,13 +352,20 @@ bool JsonToString(VekMempool* mempool, VekHashStringToStringNew* internTable, In
     p += 2;
     run = p;
   }
-  input.pCurM = p == end ? p : p + 1;
+  size_t n;
   if (!scratch) {
-    result = MakeResult(mempool, internTable, start, static_cast<size_t>(p - start));
+    n = static_cast<size_t>(p - start);
+    result = MakeResult(mempool, internTable, start, n);
   } else {
     scratch->AppendBytes(run, static_cast<unsigned long>(p - run));
-    result = MakeResult(mempool, internTable, scratch->GetData(), scratch->GetLength());
+    n = scratch->GetLength();
+    result = MakeResult(mempool, internTable, scratch->GetData(), n);
   }
+  if ((scratch && scratch->HasFailed()) || (result.FEmpty() && n != 0)) {
+    input.pCurM = start - 1;  // out of memory: back at the opening quote
+    return false;
+  }
+  input.pCurM = p == end ? p : p + 1;
   return true;
 }
 

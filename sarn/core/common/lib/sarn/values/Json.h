@@ -105,7 +105,9 @@ SARN_EXPORT bool EscapedCharToChar(char escaped, char& result);
 // empty) after skipping whitespace. A quoted string may end at the end of the range without a
 // closing quote. Fails on a NUL in a quoted string, an unknown escape, or a backslash as the
 // last byte; the cursor then rests at the offending byte. With `internTable`, a text that the
-// table maps to a non-empty string gives that stored string (the table is not modified).
+// table maps to a non-empty string gives that stored string (the table is not modified). When
+// memory runs out it fails with the cursor back where the text starts (its opening quote, where
+// malformed text never fails), so the caller can tell the two apart.
 SARN_EXPORT bool JsonToString(VekMempool* mempool, VekHashStringToStringNew* internTable, InputPointer& input,
                               VekString& result);
 

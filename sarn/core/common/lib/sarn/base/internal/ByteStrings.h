@@ -35,6 +35,8 @@ class SizedByteString : public vek::ByteBuffer {
 // (and `data` null) when it cannot be allocated.
 inline ref<SizedByteString> NewSizedByteString(VekMempool* pool, size_t length, unsigned char*& data) {
   ref<SizedByteString> bytes(new (pool) SizedByteString(pool));
+  data = nullptr;
+  if (!bytes) return bytes;
   data = bytes->Resize(length);
   if (data == nullptr && length != 0) return ref<SizedByteString>();
   return bytes;

@@ -2,15 +2,17 @@
 // objects, so that the depth of an object tree never becomes depth of the C stack.
 //
 // Frames are plain data (copied with memcpy when the stack grows). The first kInline frames live
-// in the stack object itself; deeper walks grow a block in the walker's pool, doubling it.
-// Internal to the library.
+// in the stack object itself; deeper walks grow a block in the walker's pool, doubling it. When
+// the pool cannot supply a bigger block, Push returns null and the stack stays as it was, so the
+// walker can unwind and report the failure. Internal to the library.
 #pragma once
 
+#include <climits>
+#include <cstdint>
 #include <cstring>
 #include <type_traits>
 
 #include "vek/VekMempool.h"
-#include "vek/VekServices.h"
 
 namespace sarn {
 namespace internal {
@@ -31,25 +33,28 @@ class WalkStack {
   unsigned Count() const { return nCountM; }
   // The top frame; references stay valid until the next Push.
   T& Top() { return pFramesM[nCountM - 1]; }
-  // A new, zeroed top frame.
-  T& Push() {
-    if (nCountM == nCapacityM) Grow();
-    T& frame = pFramesM[nCountM++];
-    std::memset(static_cast<void*>(&frame), 0, sizeof frame);
+  // Frame `i` from the bottom (below Count); valid until the next Push.
+  T& At(unsigned i) { return pFramesM[i]; }
+  // A new, zeroed top frame; null when the stack cannot grow.
+  T* Push() {
+    if (nCountM == nCapacityM && !Grow()) return nullptr;
+    T* frame = &pFramesM[nCountM++];
+    std::memset(static_cast<void*>(frame), 0, sizeof *frame);
     return frame;
   }
   void Pop() { --nCountM; }
 
  private:
-  void Grow() {
+  bool Grow() {
+    if (nCapacityM > UINT_MAX / 2 || static_cast<size_t>(nCapacityM) * 2 > SIZE_MAX / sizeof(T)) return false;
     unsigned capacity = nCapacityM * 2;
     T* frames = static_cast<T*>(pMempoolM->Malloc(sizeof(T) * capacity));
-    // The writers have no error path; running out of memory is not an input error.
-    VekAssert(frames != nullptr);
+    if (frames == nullptr) return false;
     std::memcpy(static_cast<void*>(frames), pFramesM, sizeof(T) * nCountM);
     if (pFramesM != inlineM) pMempoolM->Free(pFramesM);
     pFramesM = frames;
     nCapacityM = capacity;
+    return true;
   }
 
   VekMempool* pMempoolM;

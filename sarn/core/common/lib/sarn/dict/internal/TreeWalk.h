@@ -5,6 +5,7 @@
 #include "sarn/dict/Dictionary.h"
 
 namespace sarn {
+namespace internal {
 
 // The per-thread release queue. Releasing a container's children one by one through DownRef
 // would recurse once per nesting level, so a tree deep enough exhausts the native stack however
@@ -39,4 +40,5 @@ class TreeWalk {
   static void Write(const DictValue& value, wynbaselib::Bytesink& out, JsonFormat format);
 };
 
+}  // namespace internal
 }  // namespace sarn

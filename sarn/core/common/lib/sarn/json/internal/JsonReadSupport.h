@@ -6,6 +6,7 @@
 #include "sarn/dict/Dictionary.h"
 
 namespace sarn {
+namespace internal {
 
 class JsonReadSupport {
  public:
@@ -13,7 +14,8 @@ class JsonReadSupport {
 
   // The key as a string in the pool. Documents repeat the same few keys in every record, so
   // short keys go through a small direct-mapped cache and equal keys share one representation
-  // (a reference count instead of an allocation and a copy).
+  // (a reference count instead of an allocation and a copy). Empty for a non-empty key when
+  // memory runs out.
   VekString Key(const char* data, size_t n) {
     if (n == 0 || n > kMaxCachedKey) return VekString::FromUtf8Bytes(pMempoolM, n, data);
     uint64_t head = 0, tail = 0;
@@ -54,4 +56,5 @@ class JsonReadSupport {
   VekString vSlotM[kSlots];
 };
 
+}  // namespace internal
 }  // namespace sarn
