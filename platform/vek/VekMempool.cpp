@@ -217,24 +217,36 @@ VekMempool* VekMempool::Default() {
 
 inline bool VekMempool::IsOwnerThread() const { return pOwnerM == &tThreadMarkerG; }
 
-inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
-  // Only one thread writes each of the plain counters, so a load and a store suffice (others
-  // only read them). The bytes of all other threads share one counter so that the high water
-  // is one sum away.
-  if (cache == &ownerCacheM) {
-    ownerUsedM.store(ownerUsedM.load(std::memory_order_relaxed) + nByte, std::memory_order_relaxed);
-  } else {
-    sharedUsedM.fetch_add(nByte, std::memory_order_relaxed);
-  }
+inline void VekMempool::CountBlocks(Cache* cache, size_t nBlock) {
   if (cache != nullptr) {
+    // Only the cache's thread writes its count, so a load and a store suffice.
     cache->liveM.store(cache->liveM.load(std::memory_order_relaxed) + nBlock, std::memory_order_relaxed);
   } else {
     sharedLiveM.fetch_add(nBlock, std::memory_order_relaxed);
   }
 }
 
-inline void VekMempool::RaiseHighWater() {
-  size_t used = GetUsedBytes();
+inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
+  // Only the owner writes its bytes (a load and a store suffice); the bytes of all other
+  // threads share one counter so that the high water is one sum away.
+  if (cache == &ownerCacheM) {
+    ownerUsedM.store(ownerUsedM.load(std::memory_order_relaxed) + nByte, std::memory_order_relaxed);
+  } else {
+    sharedUsedM.fetch_add(nByte, std::memory_order_relaxed);
+  }
+  CountBlocks(cache, nBlock);
+}
+
+inline void VekMempool::CountAndRaise(Cache* cache, size_t nByte, size_t nBlock) {
+  size_t used;
+  if (cache == &ownerCacheM) {
+    size_t mine = ownerUsedM.load(std::memory_order_relaxed) + nByte;
+    ownerUsedM.store(mine, std::memory_order_relaxed);
+    used = mine + sharedUsedM.load(std::memory_order_relaxed);
+  } else {
+    used = sharedUsedM.fetch_add(nByte, std::memory_order_relaxed) + nByte + ownerUsedM.load(std::memory_order_relaxed);
+  }
+  CountBlocks(cache, nBlock);
   // A sum that looks negative mixes a free seen on one side with an allocation not yet seen on
   // the other; it is never a peak.
   if (used > SIZE_MAX / 2) return;
@@ -420,8 +432,7 @@ void* VekMempool::MallocSmall(size_t nByte) {
   SlackOf(slab, c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
   Poison(node, kLayoutG.vLayoutM[c].blockBytesM);
   Unpoison(node, nByte);
-  Count(cache, nByte, 1);
-  RaiseHighWater();
+  CountAndRaise(cache, nByte, 1);
   return node;
 }
 
@@ -449,8 +460,7 @@ void* VekMempool::MallocLarge(size_t nByte) {
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
   header->pPoolM = this;
-  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte, 1);
-  RaiseHighWater();
+  CountAndRaise(IsOwnerThread() ? &ownerCacheM : nullptr, nByte, 1);
   return header + 1;
 }
 
@@ -461,8 +471,11 @@ void* VekMempool::ReallocLarge(void* p, size_t nByte) {
   LargeHeader* header = static_cast<LargeHeader*>(std::realloc(HeaderOf(p), sizeof(LargeHeader) + nByte));
   if (header == nullptr) return nullptr;
   header->nByteM = nByte;
-  Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
-  if (nByte > old) RaiseHighWater();
+  if (nByte > old) {
+    CountAndRaise(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
+  } else {
+    Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
+  }
   return header + 1;
 }
 
@@ -485,8 +498,7 @@ void* VekMempool::Malloc(size_t nByte) {
   cache->vHeadM[c] = node->pNextM;
   --cache->vCountM[c];
   SlackOf(SlabOf(node), c, node) = static_cast<uint8_t>(kLayoutG.vLayoutM[c].blockBytesM - nByte);
-  Count(cache, nByte, 1);
-  RaiseHighWater();
+  CountAndRaise(cache, nByte, 1);
   return node;
 }
 
@@ -513,8 +525,11 @@ void* VekMempool::Realloc(void* p, size_t nByte) {
     SlackOf(slab, slab->classM, p) = static_cast<uint8_t>(kLayoutG.vLayoutM[slab->classM].blockBytesM - nByte);
     Poison(p, kLayoutG.vLayoutM[slab->classM].blockBytesM);
     Unpoison(p, nByte);
-    Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
-    if (nByte > old) RaiseHighWater();
+    if (nByte > old) {
+      CountAndRaise(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
+    } else {
+      Count(IsOwnerThread() ? &ownerCacheM : nullptr, nByte - old, 0);
+    }
     return p;
   }
   void* q = Malloc(nByte);

@@ -114,9 +114,11 @@ class VekMempool {
   // Adds `nByte` bytes and `nBlock` blocks (both may be "negative", modulo 2^64) to the counts
   // of the calling thread: the owner's, those of the thread's cache, or (null) the shared ones.
   void Count(Cache* cache, size_t nByte, size_t nBlock);
+  void CountBlocks(Cache* cache, size_t nBlock);
+  // Count, then raise the high water to the sum the counts now give.
+  void CountAndRaise(Cache* cache, size_t nByte, size_t nBlock);
   // The owner's cache or the calling thread's last cache when it is this pool's, else null.
   Cache* KnownCacheOf();
-  void RaiseHighWater();
 
   // The slabs, under lockM. Refill moves up to `nWant` blocks of class `c` to the cache and
   // returns false when not one could be had; Spill gives `n` of the cache's blocks back.
