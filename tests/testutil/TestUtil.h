@@ -82,4 +82,10 @@ std::string CorpusDir(const std::string& name);
 // Reads a whole file; false when it cannot be read.
 bool ReadFile(const std::string& path, std::string& out);
 
+// A table of text cases kept under tests/data (`name` is relative to it): one case a line, its
+// `nFields` fields separated by " => ", with the escapes \\ \n \r \t \0 and \xHH (two digits)
+// decoded; empty lines and lines starting with '#' are skipped. A missing file or a line with
+// another number of fields fails the test.
+std::vector<std::vector<std::string>> ReadTable(const std::string& name, size_t nFields);
+
 }  // namespace sarntest
