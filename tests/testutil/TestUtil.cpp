@@ -118,6 +118,7 @@ std::vector<std::vector<std::string>> ReadTable(const std::string& name, size_t 
     if (fields.size() != nFields) ADD_FAILURE() << name << ":" << lineNumber + 1 << ": " << fields.size() << " fields";
     else rows.push_back(std::move(fields));
   }
+  if (rows.empty()) ADD_FAILURE() << "no cases in tests/data/" << name;
   return rows;
 }
 
