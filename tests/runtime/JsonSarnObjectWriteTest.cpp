@@ -90,15 +90,6 @@ TEST_F(JsonWriteTest, UnsignedIdsAndUnknownDataTypes) {
             "\"e\": \"xxx.281474976710655\", \"type\": \"t\"}");
 }
 
-TEST_F(JsonWriteTest, WorkedAddress) {
-  ref<SarnObject> object = sarntest::MakeWorkedAddress(&poolM);
-  auto* address = static_cast<sarnschema::Address*>(object.Get());
-  address->street2M = "not written";
-  EXPECT_EQ(Write(address, 42),
-            "{\"addressId\": \"vask:ds.7\", \"city\": \"Oslo\", \"country\": \"NO\", \"levelOfDetail\": \"high\", "
-            "\"postalCode\": \"0150\", \"state\": \"\", \"street1\": \"Main St 1\", \"type\": \"address\"}");
-}
-
 TEST_F(JsonWriteTest, DefaultTestAllTypesWritesEveryRequiredForm) {
   ref<SarnObject> object = sarnschema::TestAllTypes::Factory(&poolM);
   // Null required references (anyDict, knownDict, struct, union) write nothing, commas stay right.
