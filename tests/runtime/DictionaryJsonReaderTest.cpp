@@ -1,5 +1,5 @@
 // The hand-written reader: accepted shapes, every message with its inside-out joining, the
-// member entry points, the depth limit, and large documents.
+// member entry points, the depth limit, the array count limit and the golden forms.
 #include <functional>
 #include <string>
 #include <vector>
@@ -116,36 +116,6 @@ TEST_F(DictionaryJsonReaderTest, RefusesArraysPastThePlatformCount) {
   EXPECT_FALSE(Read(&poolM, json + "0]}", &error));
   EXPECT_EQ(error, "JSON array holds more than 65535 elements. Failed to parse an array member. "
                    "Failed to parse value for key a");
-}
-
-// About 5 MB of records: read, write compact and pretty, read both back to equal trees.
-TEST_F(DictionaryJsonReaderTest, ReadsAndRewritesAFiveMegabyteDocument) {
-  std::string json = "{\"records\": [";
-  for (int i = 0; i < 20000; ++i) {
-    if (i > 0) json += ", ";
-    json += "{\"id\": \"" + std::to_string(1000000000000LL + i) + "\", \"name\": \"record \\\"" + std::to_string(i) +
-            "\\\" caf\xC3\xA9\", \"n\": " + std::to_string(i * 3) + ", \"tags\": [\"a\", \"b\", null, true], " +
-            "\"nested\": {\"x\": 1.5, \"y\": [1, 2, 3], \"z\": {\"deep\": \"value " + std::to_string(i) +
-            "\"}}, \"pad\": \"" + std::string(150, 'p') + "\"}";
-  }
-  json += "]}";
-  ASSERT_GT(json.size(), 5000000u);
-  std::string error;
-  ref<Dictionary> tree = Read(&poolM, json, &error);
-  ASSERT_TRUE(tree) << error;
-  EXPECT_EQ(tree->GetArray(VekString("records"))->CountValues(), 20000);
-  ref<Dictionary> compact = Read(&poolM, Compact(tree));
-  ref<Dictionary> pretty = Read(&poolM, Pretty(tree));
-  ASSERT_TRUE(compact && pretty);
-  EXPECT_TRUE(tree->Equals(compact));
-  EXPECT_TRUE(tree->Equals(pretty));
-  EXPECT_EQ(Compact(compact), Compact(tree));
-  // The streaming parser, 512 bytes at a time, builds the same tree (the text has no \u escapes).
-  VekString streamError;
-  ref<Dictionary> streamed =
-      Dictionary::FromJsonBytesource(new wynbaselib::InMemoryBytestream(json), streamError, &poolM);
-  ASSERT_TRUE(streamed) << Str(streamError);
-  EXPECT_TRUE(streamed->Equals(tree));
 }
 
 // A small document with its exact compact and pretty forms, kept as files.

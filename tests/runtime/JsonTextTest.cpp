@@ -48,18 +48,6 @@ TEST(JsonWriteTest, LongTextsAndSinkFailures) {
   EXPECT_FALSE(sarn::Json::StringToJson(VekString("x"), false, failing));
 }
 
-TEST(JsonWriteTest, EscapedCharToChar) {
-  // Each byte after a backslash: its meaning, or 'z' (left alone) when it is no escape.
-  std::string meanings;
-  for (int c = 0; c < 256; ++c) {
-    char result = 'z';
-    bool fOk = sarn::Json::EscapedCharToChar(static_cast<char>(c), result);
-    EXPECT_EQ(fOk, result != 'z') << c;
-    if (fOk) meanings += std::string(1, static_cast<char>(c)) + result;
-  }
-  EXPECT_EQ(meanings, "\"\"//\\\\b\bf\fn\nr\rt\t");
-}
-
 struct ReadResult {
   bool fOk;
   std::string text;

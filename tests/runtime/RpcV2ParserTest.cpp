@@ -219,21 +219,4 @@ TEST(RpcV2ParserTest, EndParseAndDestructorInEveryState) {
   EXPECT_EQ(log.Text(), kInvalidHeaderSize);
 }
 
-TEST(RpcV2ParserTest, LargeBodyStreamsThroughWithoutCopies) {
-  const std::string body(RpcV2Parser::BODY_LENGTH_LIMIT, 'b');
-  const std::string frame = Frame(Block({"RpcId: 1", "Type: response"}), body);
-  Recorder log;
-  RpcV2Parser parser(log);
-  size_t chunks = 0;
-  for (std::string_view chunk : sarntest::FixedChunks(frame, 512)) {
-    ASSERT_TRUE(parser.ParseChunk(chunk.data(), chunk.size()));
-    ASSERT_TRUE(parser.bodyBytesReadM == 0 ||
-                (log.lastBodyChunkM >= chunk.data() && log.lastBodyChunkM < chunk.data() + chunk.size()));
-    ++chunks;
-  }
-  EXPECT_TRUE(parser.bodyBytesReadM == body.size() && parser.stateM == RpcV2Parser::StateDone);
-  EXPECT_EQ(log.eventsM[log.eventsM.size() - 2], "body " + body);
-  EXPECT_EQ(log.piecesM, chunks);  // the first chunk holds the head and the body's start
-}
-
 }  // namespace
