@@ -7,13 +7,11 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace dictfuzz {
 
-// The fuzzers report a broken oracle by crashing, which libFuzzer and the replay both catch.
-inline void Require(bool condition) {
-  if (!condition) std::abort();
-}
+using sarntest::Require;
 
 // Whether a text holds what the writer passes through unescaped and yajl then reads back
 // differently: a backslash before 'u', or the raw bytes 0x03 and 0x1A.

@@ -7,18 +7,13 @@
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "testutil/TestStreams.h"
 
 using sarn::GoogleInt;
 using sarn::ProtoBufByteOutputStream;
+using sarntest::Finished;
 
 namespace {
-
-std::string Finished(ProtoBufByteOutputStream& stream) {
-  const unsigned char* data;
-  unsigned long length;
-  stream.Finish(data, length);
-  return std::string(reinterpret_cast<const char*>(data), length);
-}
 
 // The varint of a section length, as Finish writes it.
 std::string Length(size_t n) {

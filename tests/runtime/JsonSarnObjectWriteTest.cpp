@@ -228,10 +228,7 @@ TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
        [&](VekMempool* pool, std::string& bytes) {
          ProtoBufByteOutputStream out;
          ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG).MarshalKnownDict(chain.front().Get(), &out);
-         const unsigned char* data;
-         unsigned long length;
-         out.Finish(data, length);
-         bytes.assign(reinterpret_cast<const char*>(data), length);
+         bytes = sarntest::Finished(out);
          return !out.IsOutOfMemory();
        },
        2 + varintLength(fields) + fields, "\xD2\x15", std::string("\xD2\x15\x04\x08\x03\x1A\x00", 7)},

@@ -24,10 +24,7 @@ class ProtoBufTest : public sarntest::PoolTest {
   std::string Write(const std::function<void(const ProtoBuf&, ProtoBufByteOutputStream*)>& write) {
     ProtoBufByteOutputStream out;
     write(Codec(), &out);
-    const unsigned char* data;
-    unsigned long length;
-    out.Finish(data, length);
-    return std::string(reinterpret_cast<const char*>(data), length);
+    return sarntest::Finished(out);
   }
   std::string Known(const SarnObject* object) {
     return Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(object, out); });

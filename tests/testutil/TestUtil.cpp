@@ -20,12 +20,6 @@ void ForEachSplit(std::string_view input,
   }
 }
 
-std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
-  std::vector<std::string_view> chunks;
-  for (size_t at = 0; at < input.size(); at += size) chunks.push_back(input.substr(at, size));
-  return chunks;
-}
-
 void RunOnStack(size_t bytes, const std::function<void()>& work) {
 #if defined(__SANITIZE_ADDRESS__) || !defined(__OPTIMIZE__)
   bytes *= 8;
@@ -41,16 +35,6 @@ void RunOnStack(size_t bytes, const std::function<void()>& work) {
   ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
   pthread_join(thread, nullptr);
   pthread_attr_destroy(&attributes);
-}
-
-size_t TestSource::Read(void* buffer, size_t size) {
-  ++nReadM;
-  while (indexM < chunksM.size() && offsetM == chunksM[indexM].size()) ++indexM, offsetM = 0;
-  if (indexM == chunksM.size()) return 0;
-  size_t n = std::min(size, chunksM[indexM].size() - offsetM);
-  std::memcpy(buffer, chunksM[indexM].data() + offsetM, n);
-  offsetM += n;
-  return n;
 }
 
 std::string CorpusDir(const std::string& name) {
