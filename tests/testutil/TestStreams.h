@@ -39,6 +39,21 @@ inline std::vector<std::string_view> FixedChunks(std::string_view input, size_t 
   return chunks;
 }
 
+// The streaming JSON parser fed `chunks`, stopping at the first refusal; the tree is returned even
+// on failure (it may be partial), with the parser's message in `error` ("" on success).
+inline ref<sarn::Dictionary> StreamParse(VekMempool* pool, const std::vector<std::string_view>& chunks, bool* isOk,
+                                         std::string* error = nullptr,
+                                         const sarn::JsonLimits& limits = sarn::JsonLimits()) {
+  sarn::PDictionary result;
+  sarn::JsonParser parser(pool, limits);
+  parser.BeginParse(result);
+  bool ok = true;
+  for (size_t i = 0; ok && i < chunks.size(); ++i) ok = parser.ParseChunk(chunks[i].data(), chunks[i].size());
+  *isOk = ok && parser.EndParse();
+  if (error != nullptr) *error = *isOk || parser.pErrorTextM == nullptr ? "" : parser.pErrorTextM;
+  return result;
+}
+
 // A byte source that hands out the given chunks, one per Read (a chunk larger than the request
 // goes in pieces), counts its reads, reports an error at its end when `isFailing`, and adds one
 // to `*pDeleted` when it is deleted.
