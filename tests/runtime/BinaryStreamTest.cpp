@@ -7,7 +7,7 @@
 #include <string>
 
 #include "sarn/Sarn.h"
-#include "testutil/TestStreams.h"
+#include "testutil/TestUtil.h"
 
 using sarn::GoogleInt;
 using sarn::ProtoBufByteOutputStream;
@@ -42,31 +42,18 @@ std::string FinishedScript(const std::string& script) {
 }  // namespace
 
 TEST(GoogleIntTest, WritersGiveExactBytes) {
-  // 'u' and 'U' unsigned 32 and 64 bits, 's' and 'S' zig-zag signed.
-  const struct {
-    char kind;
-    unsigned long long value;
-    std::string bytes;
-  } cases[] = {
-      {'u', 0, std::string(1, '\0')}, {'u', 127, "\x7F"}, {'u', 128, "\x80\x01"}, {'u', 300, "\xAC\x02"},
-      {'u', 100, "d"},  // 0x64 as data survives its escape
-      {'u', 0xFFFFFFFF, "\xFF\xFF\xFF\xFF\x0F"}, {'U', ~0ull, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {'s', static_cast<unsigned long long>(-1), "\x01"}, {'s', 1, "\x02"},
-      {'s', static_cast<unsigned long long>(-2147483647LL - 1), "\xFF\xFF\xFF\xFF\x0F"},
-      {'S', 1ull << 63, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {'S', 0x7FFFFFFFFFFFFFFFull, "\xFE\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-  };
-  for (const auto& c : cases) {
-    EXPECT_EQ(Written([&](ProtoBufByteOutputStream* s) {
-                switch (c.kind) {
-                  case 'u': return GoogleInt::WriteGoogleU32(static_cast<uint32_t>(c.value), s);
-                  case 'U': return GoogleInt::WriteGoogleU64(c.value, s);
-                  case 's': return GoogleInt::WriteGoogleS32(static_cast<int32_t>(c.value), s);
-                  default: return GoogleInt::WriteGoogleS64(static_cast<long long>(c.value), s);
-                }
+  for (const auto& row : sarntest::ReadTable("binary/varints.txt", 3)) {
+    const std::string& kind = row[0];
+    const long long s = kind[0] == 's' ? std::stoll(row[1]) : 0;
+    const unsigned long long u = kind[0] == 'u' ? std::stoull(row[1]) : 0;
+    EXPECT_EQ(Written([&](ProtoBufByteOutputStream* out) {
+                if (kind == "u32") return GoogleInt::WriteGoogleU32(static_cast<uint32_t>(u), out);
+                if (kind == "u64") return GoogleInt::WriteGoogleU64(u, out);
+                if (kind == "s32") return GoogleInt::WriteGoogleS32(static_cast<int32_t>(s), out);
+                return GoogleInt::WriteGoogleS64(s, out);
               }),
-              c.bytes)
-        << c.kind << " " << c.value;
+              row[2])
+        << kind << " " << row[1];
   }
 }
 
@@ -82,22 +69,9 @@ std::string ReadText(bool (*read)(const unsigned char**, const unsigned char*, T
 
 TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
   const std::string untouched = "no 77 @0";
-  const struct {
-    std::string bytes;
-    std::string read32, read64;
-  } cases[] = {
-      {"\x05rest", "ok 5 @1", "ok 5 @1"},
-      {"\xAC\x02", "ok 300 @2", "ok 300 @2"},
-      {"\xFF\xFF\xFF\xFF\x7F", "ok 4294967295 @5", "ok 34359738367 @5"},  // surplus bits dropped at 32
-      {"\x80\x80\x80\x80\x80\x01", untouched, "ok 34359738368 @6"},       // six bytes: too long for 32
-      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", untouched, "ok 18446744073709551615 @10"},
-      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", untouched, untouched},  // eleven bytes
-      {"\x80", untouched, untouched},                                          // truncated
-      {"", untouched, untouched},
-  };
-  for (const auto& c : cases) {
-    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, c.bytes), c.read32) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, c.bytes), c.read64) << testing::PrintToString(c.bytes);
+  for (const auto& row : sarntest::ReadTable("binary/varint-reads.txt", 3)) {
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, row[0]), row[1]) << testing::PrintToString(row[0]);
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, row[0]), row[2]) << testing::PrintToString(row[0]);
   }
   // Every proper prefix of a varint is refused with cursor and value untouched.
   const std::string tenBytes = "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01";
