@@ -1,5 +1,5 @@
 // The hand-written reader: accepted shapes, every message with its inside-out joining, the
-// member entry points, the depth limit, the array count limit and the golden forms.
+// member entry points, the depth limit and the golden forms.
 #include <functional>
 #include <string>
 #include <vector>
@@ -104,18 +104,6 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
 
   // Deep input far past the limit is refused without descending into it.
   EXPECT_FALSE(Read(&poolM, std::string(1, '{') + "a:" + std::string(1000000, '['), &error));
-}
-
-TEST_F(DictionaryJsonReaderTest, RefusesArraysPastThePlatformCount) {
-  std::string json = "{a:[";
-  for (int i = 0; i < 65535; ++i) json += "0,";
-  ref<Dictionary> tree = Read(&poolM, json.substr(0, json.size() - 1) + "]}");
-  ASSERT_TRUE(tree);
-  EXPECT_EQ(tree->GetArray(VekString("a"))->CountValues(), 65535);
-  std::string error;
-  EXPECT_FALSE(Read(&poolM, json + "0]}", &error));
-  EXPECT_EQ(error, "JSON array holds more than 65535 elements. Failed to parse an array member. "
-                   "Failed to parse value for key a");
 }
 
 // A small document with its exact compact and pretty forms, kept as files.
