@@ -4,16 +4,16 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
+#include <algorithm>
+#include <string_view>
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace dictfuzz {
 
-// The fuzzers report a broken oracle by crashing, which libFuzzer and the replay both catch.
-inline void Require(bool condition) {
-  if (!condition) std::abort();
-}
+using sarntest::Require;
 
 // Whether a text holds what the writer passes through unescaped and yajl then reads back
 // differently: a backslash before 'u', or the raw bytes 0x03 and 0x1A.
@@ -78,41 +78,17 @@ inline bool SplitInput(const uint8_t* data, size_t size, Input& input) {
   return true;
 }
 
-// Splits `size` bytes into chunks whose lengths come from `seed` bytes (1 to 64 each, cycling).
-inline std::vector<size_t> ChunkLengths(const uint8_t* seed, size_t nSeed, size_t size) {
-  std::vector<size_t> lengths;
+// Cuts the `size` bytes at `data` into chunks whose lengths come from `seed` bytes (1 to 64 each,
+// cycling); no seed gives the whole text as one chunk.
+inline std::vector<std::string_view> Chunks(const uint8_t* data, size_t size, const uint8_t* seed = nullptr,
+                                            size_t nSeed = 0) {
+  std::vector<std::string_view> chunks;
   for (size_t at = 0, i = 0; at < size; ++i) {
     size_t n = nSeed == 0 ? size : 1 + seed[i % nSeed] % 64;
-    if (n > size - at) n = size - at;
-    lengths.push_back(n);
-    at += n;
+    chunks.emplace_back(reinterpret_cast<const char*>(data) + at, std::min(n, size - at));
+    at += chunks.back().size();
   }
-  return lengths;
-}
-
-// The streaming parser over `data` cut into the given chunks.
-inline ref<sarn::Dictionary> StreamParse(VekMempool* pool, const uint8_t* data, const std::vector<size_t>& lengths,
-                                         bool* isOk, const sarn::JsonLimits& limits) {
-  sarn::PDictionary result;
-  sarn::JsonParser parser(pool, limits);
-  parser.BeginParse(result);
-  bool ok = true;
-  size_t at = 0;
-  for (size_t n : lengths) {
-    if (!parser.ParseChunk(reinterpret_cast<const char*>(data + at), n)) {
-      ok = false;
-      break;
-    }
-    at += n;
-  }
-  *isOk = ok && parser.EndParse();
-  return result;
-}
-
-inline ref<sarn::Dictionary> StreamParseText(VekMempool* pool, const VekString& text, bool* isOk) {
-  std::vector<size_t> whole{text.NByte()};
-  if (text.NByte() == 0) whole.clear();
-  return StreamParse(pool, reinterpret_cast<const uint8_t*>(text.Utf8()), whole, isOk, sarn::JsonLimits());
+  return chunks;
 }
 
 }  // namespace dictfuzz

@@ -8,15 +8,12 @@
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace {
 
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
-
-std::string Bytes(const ref<vek::ByteBuffer>& b) { return std::string(reinterpret_cast<const char*>(b->GetData()), b->GetLength()); }
-std::string Bytes(const VekString& s) { return std::string(s.Utf8(), s.NByte()); }
+using sarntest::Require;
+using sarntest::Str;
 
 // The byte list as the C library reads it: strtol on a NUL-terminated copy of each token.
 std::string ReferenceByteList(const std::string& text) {
@@ -49,27 +46,27 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     ref<vek::ByteBuffer> input = vek::ByteBuffer::New(&pool, data + 1, size - 1);
     ref<vek::ByteBuffer> decoded;
     if (codec.Decode(&pool, input, decoded)) {
-      Check(decoded->GetLength() <= (size - 1) / 4 * 3);
+      Require(decoded->GetLength() <= (size - 1) / 4 * 3);
       ref<vek::ByteBuffer> encoded;
       codec.Encode(&pool, decoded, encoded);
-      Check(encoded->GetLength() == size - 1);
+      Require(encoded->GetLength() == size - 1);
       ref<vek::ByteBuffer> again;
-      Check(codec.Decode(&pool, encoded, again));
-      Check(Bytes(again) == Bytes(decoded));
+      Require(codec.Decode(&pool, encoded, again));
+      Require(Str(again) == Str(decoded));
     }
     VekString text = VekString::FromUtf8Bytes(&pool, size - 1, data + 1);
     if (!isOther) {
       ref<vek::ByteBuffer> viaText = sarn::DecodeBase64(&pool, text);
-      Check(viaText && Bytes(viaText) == (decoded ? Bytes(decoded) : std::string()));
+      Require(viaText && Str(viaText) == (decoded ? Str(decoded) : std::string()));
     }
 
-    std::string list = Bytes(sarn::ParseBytes(&pool, text));
-    Check(list == ReferenceByteList(Bytes(text)));
-    Check(Bytes(sarn::ParseBytesToBytestring(&pool, text)) == list);
+    std::string list = Str(sarn::ParseBytes(&pool, text));
+    Require(list == ReferenceByteList(Str(text)));
+    Require(Str(sarn::ParseBytesToBytestring(&pool, text)) == list);
     VekString formatted = sarn::FormatBytes(&pool, text);
-    Check(formatted.NByte() == 3 * text.NByte());
-    Check(Bytes(sarn::ParseBytes(&pool, formatted)) == Bytes(text));
+    Require(formatted.NByte() == 3 * text.NByte());
+    Require(Str(sarn::ParseBytes(&pool, formatted)) == Str(text));
   }
-  Check(pool.GetUsedBytes() == 0);
+  Require(pool.GetUsedBytes() == 0);
   return 0;
 }

@@ -9,12 +9,11 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace {
 
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
+using sarntest::Require;
 
 std::string Varint(uint64_t value) {
   std::string out;
@@ -44,18 +43,17 @@ void CheckReader(const uint8_t* data, size_t n, Read read, Write write) {
   const unsigned char* cursor = data;
   T value = T(7);
   if (!read(&cursor, data + n, &value)) {
-    Check(cursor == data && value == T(7));
+    Require(cursor == data && value == T(7));
     return;
   }
-  Check(cursor > data && cursor <= data + n);
+  Require(cursor > data && cursor <= data + n);
   sarn::ProtoBufByteOutputStream out;
   write(value, &out);
-  const unsigned char* bytes;
-  unsigned long length;
-  out.Finish(bytes, length);
+  const std::string written = sarntest::Finished(out);
+  const unsigned char* bytes = reinterpret_cast<const unsigned char*>(written.data());
   const unsigned char* again = bytes;
   T reread;
-  Check(read(&again, bytes + length, &reread) && reread == value && again == bytes + length);
+  Require(read(&again, bytes + written.size(), &reread) && reread == value && again == bytes + written.size());
 }
 
 }  // namespace
@@ -85,10 +83,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   size_t at = 0;
   std::string expected = Reference(ops.data(), ops.size(), at);
-  const unsigned char* bytes;
-  unsigned long length;
-  stream.Finish(bytes, length);
-  Check(std::string(reinterpret_cast<const char*>(bytes), length) == expected);
+  Require(sarntest::Finished(stream) == expected);
 
   using G = sarn::GoogleInt;
   CheckReader<unsigned int>(data, size, G::ReadGoogleU32, G::WriteGoogleU32);

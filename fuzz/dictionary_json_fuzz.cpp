@@ -45,7 +45,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
       dictfuzz::Require(back && back->Equals(tree));
     }
     bool isOk;
-    ref<Dictionary> streamed = dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(input.pSeedM, input.nSeedM, n), &isOk, limits);
+    ref<Dictionary> streamed = sarntest::StreamParse(&pool, dictfuzz::Chunks(json, n, input.pSeedM, input.nSeedM), &isOk, nullptr, limits);
     if (tree && isOk && std::memchr(json, '\\', n) == nullptr) dictfuzz::Require(streamed->Equals(tree));
   }
   dictfuzz::Require(pool.GetUsedBytes() == 0);

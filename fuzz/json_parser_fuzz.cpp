@@ -22,11 +22,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   {
     bool isWholeOk;
     bool isChunkedOk;
-    std::vector<size_t> whole;
-    if (n > 0) whole.push_back(n);
-    ref<Dictionary> tree = dictfuzz::StreamParse(&pool, json, whole, &isWholeOk, limits);
+    ref<Dictionary> tree = sarntest::StreamParse(&pool, dictfuzz::Chunks(json, n), &isWholeOk, nullptr, limits);
     ref<Dictionary> chunked =
-        dictfuzz::StreamParse(&pool, json, dictfuzz::ChunkLengths(input.pSeedM, input.nSeedM, n), &isChunkedOk, limits);
+        sarntest::StreamParse(&pool, dictfuzz::Chunks(json, n, input.pSeedM, input.nSeedM), &isChunkedOk, nullptr, limits);
     dictfuzz::Require(isWholeOk == isChunkedOk);
     if (isWholeOk) dictfuzz::Require(tree && chunked && tree->Equals(chunked));
 
@@ -38,7 +36,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (isWholeOk && !dictfuzz::TreeHasPassThrough(*tree)) {
       for (bool pretty : {false, true}) {
         bool isBackOk;
-        ref<Dictionary> back = dictfuzz::StreamParseText(&pool, tree->ToJson(pretty), &isBackOk);
+        VekString text = tree->ToJson(pretty);
+        ref<Dictionary> back = sarntest::StreamParse(
+            &pool, dictfuzz::Chunks(reinterpret_cast<const uint8_t*>(text.Utf8()), text.NByte()), &isBackOk);
         dictfuzz::Require(isBackOk && back->Equals(tree));
       }
     }

@@ -16,14 +16,13 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace {
 
-using namespace sarn;
+using sarntest::Require;
 
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
+using namespace sarn;
 
 const std::vector<const StructInfo*>& KnownTypes() {
   static const std::vector<const StructInfo*> types = [] {
@@ -46,11 +45,11 @@ bool HoldsUnnamedValue(const std::string& json) {
 ref<SarnObject> Read(VekMempool* pool, const std::string& json, KernoVersion version) {
   VekString error;
   ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(json.data()), json.size(), error, pool);
-  Check(tree != nullptr);
+  Require(tree != nullptr);
   DictionarySarnObject converter(pool, Schema::vStructDefG, Schema::nStructDefG);
   ref<SarnObject> object;
   bool ok = converter.DictionaryToSarnObject(tree, version, object, error);
-  Check(ok || HoldsUnnamedValue(json));
+  Require(ok || HoldsUnnamedValue(json));
   return object;
 }
 
@@ -78,16 +77,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
       if (again == nullptr) return 0;
       std::string second = Text(json.SarnObjectToJson(again.Get(), version));
       if (second != text) {
-        Check(text.find("\\u00") != std::string::npos);
+        Require(text.find("\\u00") != std::string::npos);
         ref<SarnObject> third = Read(&pool, second, 0);
-        Check(third != nullptr && Text(json.SarnObjectToJson(third.Get(), version)) == second);
+        Require(third != nullptr && Text(json.SarnObjectToJson(third.Get(), version)) == second);
         return 0;
       }
 
       ref<Dictionary> back = converter.SarnObjectToDictionary(object.Get(), 0);
       ref<SarnObject> fromTree;
-      Check(converter.DictionaryToSarnObject(back, 0, fromTree, error));
-      Check(Text(json.SarnObjectToJson(fromTree.Get(), version)) == text);
+      Require(converter.DictionaryToSarnObject(back, 0, fromTree, error));
+      Require(Text(json.SarnObjectToJson(fromTree.Get(), version)) == text);
     }
   }
   return 0;

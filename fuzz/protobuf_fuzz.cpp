@@ -11,19 +11,12 @@
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace {
 
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
-
-std::string Finished(sarn::ProtoBufByteOutputStream& out) {
-  const unsigned char* data;
-  unsigned long length;
-  out.Finish(data, length);
-  return std::string(reinterpret_cast<const char*>(data), length);
-}
+using sarntest::Require;
+using sarntest::Finished;
 
 // A REQUIRED channel number or currency at INVALID anywhere in the object or the objects it holds.
 bool HoldsInvalidRequired(const sarn::SarnObject* object) {
@@ -78,14 +71,14 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         ref<sarn::SarnObject> again;
         if (!codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()),
                                       static_cast<int>(bytes.size()), &again)) {
-          Check(HoldsInvalidRequired(object.Get()));
+          Require(HoldsInvalidRequired(object.Get()));
           break;
         }
-        Check(Marshal(codec, again) == bytes);
+        Require(Marshal(codec, again) == bytes);
         break;
       }
       case 1:
-        Check(static_cast<bool>(codec.UnmarshalWrapper(input, length)));
+        Require(static_cast<bool>(codec.UnmarshalWrapper(input, length)));
         break;
       default: {
         const unsigned char* cursor = input;
@@ -96,12 +89,12 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         std::string bytes = Finished(out);
         const unsigned char* again = reinterpret_cast<const unsigned char*>(bytes.data());
         ref<sarn::Dict> dict2;
-        Check(codec.UnmarshalAnyDict(&again, again + bytes.size(), &dict2));
-        Check(dict2->ToString(false).FEqual(dict->ToString(false)));
+        Require(codec.UnmarshalAnyDict(&again, again + bytes.size(), &dict2));
+        Require(dict2->ToString(false).FEqual(dict->ToString(false)));
         break;
       }
     }
   }
-  Check(pool.GetLiveBlocks() == 0);
+  Require(pool.GetLiveBlocks() == 0);
   return 0;
 }

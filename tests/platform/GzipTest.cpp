@@ -62,29 +62,6 @@ Gunzipped Gunzip(const std::string& compressed, size_t block, VekMempool* pool =
 
 using GzipTest = sarntest::PoolTest;
 
-TEST_F(GzipTest, OneMegabyteRoundTripsThrough512ByteReads) {
-  const std::string text = SampleText(1 << 20);
-  InMemoryBytestream compressed;
-  {
-    GzipBytesink sink(&compressed, &poolM);
-    // Writes of uneven sizes, so that deflate's input never lines up with its blocks.
-    for (size_t at = 0, step = 1; at < text.size(); at += step, step = step * 3 % 7919 + 1) {
-      ASSERT_TRUE(sink.Write(text.data() + at, std::min(step, text.size() - at)));
-    }
-    EXPECT_GT(poolM.GetUsedBytes(), 0u) << "zlib's state lives in the pool";
-    ASSERT_TRUE(sink.Flush());
-    EXPECT_FALSE(sink.FError());
-  }
-  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
-  const std::string& bytes = compressed.GetContent();
-  EXPECT_TRUE(bytes.size() > 18 && bytes.size() < text.size() / 4) << bytes.size();
-  EXPECT_EQ(bytes.substr(0, 3), "\x1f\x8b\x08") << "gzip magic and deflate method";
-  Gunzipped back = Gunzip(bytes, 512, &poolM);
-  EXPECT_TRUE(!back.isErrorM && back.errorM.empty()) << back.errorM;
-  EXPECT_TRUE(back.textM == text) << "the 1 MB text differs after the round trip";
-  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
-}
-
 TEST_F(GzipTest, FlushEndsMembersThatReadBackAsOneStream) {
   InMemoryBytestream out;
   {
@@ -155,11 +132,13 @@ TEST_F(GzipTest, CorruptionIsToldFromTruncation) {
 
 TEST_F(GzipTest, DuplicateReadsTheRestWithoutDisturbingTheOriginal) {
   const std::string text = SampleText(100000);
-  InMemoryBytestream in(Gzip(text));
+  InMemoryBytestream in(Gzip(text, 777));  // writes that never line up with deflate's blocks
   GunzipBytesource original(&in, &poolM);
   std::string head(30000, '\0');
   size_t got = 0;
   while (got < head.size()) got += original.Read(&head[got], head.size() - got);
+  EXPECT_EQ(head, text.substr(0, 30000));
+  EXPECT_GT(poolM.GetUsedBytes(), 0u) << "zlib's state lives in the pool";
   std::unique_ptr<Bytesource> duplicate(original.Duplicate());
   ASSERT_NE(duplicate, nullptr);
   EXPECT_EQ(ReadAll(*duplicate, 333), text.substr(30000));
@@ -190,6 +169,7 @@ TEST_F(GzipTest, SinkFailureIsStickyAndReported) {
   GzipBytesink sink(&failing, &poolM);
   const std::string text = SampleText(200000);  // more than deflate buffers: it must write
   EXPECT_FALSE(sink.Write(text.data(), text.size()));
+  EXPECT_GT(poolM.GetUsedBytes(), 0u) << "zlib's state lives in the pool";
   EXPECT_TRUE(sink.FError() && !sink.Write("x", 1) && !sink.Flush());
 
   InMemoryBytestream out;

@@ -1,24 +1,19 @@
 // Varints and the sectioned output stream: exact bytes of writers and of Finish, readers at their
-// boundaries, and Finish against a plain length-prefix encoder on random section trees.
+// boundaries. Finish against a plain length-prefix encoder on random section trees is the oracle
+// of the binary stream fuzz target (its random_trees seed).
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <random>
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "testutil/TestUtil.h"
 
 using sarn::GoogleInt;
 using sarn::ProtoBufByteOutputStream;
+using sarntest::Finished;
 
 namespace {
-
-std::string Finished(ProtoBufByteOutputStream& stream) {
-  const unsigned char* data;
-  unsigned long length;
-  stream.Finish(data, length);
-  return std::string(reinterpret_cast<const char*>(data), length);
-}
 
 // The varint of a section length, as Finish writes it.
 std::string Length(size_t n) {
@@ -47,31 +42,18 @@ std::string FinishedScript(const std::string& script) {
 }  // namespace
 
 TEST(GoogleIntTest, WritersGiveExactBytes) {
-  // 'u' and 'U' unsigned 32 and 64 bits, 's' and 'S' zig-zag signed.
-  const struct {
-    char kind;
-    unsigned long long value;
-    std::string bytes;
-  } cases[] = {
-      {'u', 0, std::string(1, '\0')}, {'u', 127, "\x7F"}, {'u', 128, "\x80\x01"}, {'u', 300, "\xAC\x02"},
-      {'u', 100, "d"},  // 0x64 as data survives its escape
-      {'u', 0xFFFFFFFF, "\xFF\xFF\xFF\xFF\x0F"}, {'U', ~0ull, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {'s', static_cast<unsigned long long>(-1), "\x01"}, {'s', 1, "\x02"},
-      {'s', static_cast<unsigned long long>(-2147483647LL - 1), "\xFF\xFF\xFF\xFF\x0F"},
-      {'S', 1ull << 63, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-      {'S', 0x7FFFFFFFFFFFFFFFull, "\xFE\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01"},
-  };
-  for (const auto& c : cases) {
-    EXPECT_EQ(Written([&](ProtoBufByteOutputStream* s) {
-                switch (c.kind) {
-                  case 'u': return GoogleInt::WriteGoogleU32(static_cast<uint32_t>(c.value), s);
-                  case 'U': return GoogleInt::WriteGoogleU64(c.value, s);
-                  case 's': return GoogleInt::WriteGoogleS32(static_cast<int32_t>(c.value), s);
-                  default: return GoogleInt::WriteGoogleS64(static_cast<long long>(c.value), s);
-                }
+  for (const auto& row : sarntest::ReadTable("binary/varints.txt", 3)) {
+    const std::string& kind = row[0];
+    const long long s = kind[0] == 's' ? std::stoll(row[1]) : 0;
+    const unsigned long long u = kind[0] == 'u' ? std::stoull(row[1]) : 0;
+    EXPECT_EQ(Written([&](ProtoBufByteOutputStream* out) {
+                if (kind == "u32") return GoogleInt::WriteGoogleU32(static_cast<uint32_t>(u), out);
+                if (kind == "u64") return GoogleInt::WriteGoogleU64(u, out);
+                if (kind == "s32") return GoogleInt::WriteGoogleS32(static_cast<int32_t>(s), out);
+                return GoogleInt::WriteGoogleS64(s, out);
               }),
-              c.bytes)
-        << c.kind << " " << c.value;
+              row[2])
+        << kind << " " << row[1];
   }
 }
 
@@ -87,22 +69,9 @@ std::string ReadText(bool (*read)(const unsigned char**, const unsigned char*, T
 
 TEST(GoogleIntTest, ReadersStopAtTheirLimitsAndLeaveFailuresUntouched) {
   const std::string untouched = "no 77 @0";
-  const struct {
-    std::string bytes;
-    std::string read32, read64;
-  } cases[] = {
-      {"\x05rest", "ok 5 @1", "ok 5 @1"},
-      {"\xAC\x02", "ok 300 @2", "ok 300 @2"},
-      {"\xFF\xFF\xFF\xFF\x7F", "ok 4294967295 @5", "ok 34359738367 @5"},  // surplus bits dropped at 32
-      {"\x80\x80\x80\x80\x80\x01", untouched, "ok 34359738368 @6"},       // six bytes: too long for 32
-      {"\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x7F", untouched, "ok 18446744073709551615 @10"},
-      {"\x80\x80\x80\x80\x80\x80\x80\x80\x80\x80\x01", untouched, untouched},  // eleven bytes
-      {"\x80", untouched, untouched},                                          // truncated
-      {"", untouched, untouched},
-  };
-  for (const auto& c : cases) {
-    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, c.bytes), c.read32) << testing::PrintToString(c.bytes);
-    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, c.bytes), c.read64) << testing::PrintToString(c.bytes);
+  for (const auto& row : sarntest::ReadTable("binary/varint-reads.txt", 3)) {
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU32, row[0]), row[1]) << testing::PrintToString(row[0]);
+    EXPECT_EQ(ReadText(GoogleInt::ReadGoogleU64, row[0]), row[2]) << testing::PrintToString(row[0]);
   }
   // Every proper prefix of a varint is refused with cursor and value untouched.
   const std::string tenBytes = "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01";
@@ -136,38 +105,6 @@ TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
   ASSERT_EQ(deep.size(), 1u + 127 + 873 * 2);  // the 127 innermost lengths take one byte, the rest two
   EXPECT_EQ(deep.substr(deep.size() - 3), "\x02\x01" "d");
   EXPECT_EQ(Written([](ProtoBufByteOutputStream* s) { s->WriteString(VekString("hi")); }), "\x02hi");
-}
-
-TEST(ProtoBufByteOutputStreamTest, FinishMatchesAPlainEncoderOnRandomTrees) {
-  std::mt19937 random(42);
-  // Returns the finished bytes of a random tree written into `stream`, computed the plain way.
-  std::function<std::string(ProtoBufByteOutputStream&, int)> writeTree = [&](ProtoBufByteOutputStream& stream,
-                                                                           int depth) {
-    std::string out;
-    int items = static_cast<int>(random() % 6);
-    for (int i = 0; i < items; ++i) {
-      if (depth < 6 && random() % 3 == 0) {
-        stream.StartSection();
-        std::string inner = writeTree(stream, depth + 1);
-        stream.EndSection();
-        out += Length(inner.size()) + inner;
-      } else {
-        static const unsigned char kBytes[] = {0x00, 0x01, 0x02, 0x64, 0x80, 0xFF};
-        size_t run = random() % 300;  // long enough for two-byte lengths
-        for (size_t k = 0; k < run; ++k) {
-          unsigned char b = kBytes[random() % sizeof kBytes];
-          stream.WriteByte(b);
-          out.push_back(static_cast<char>(b));
-        }
-      }
-    }
-    return out;
-  };
-  for (int round = 0; round < 300; ++round) {
-    ProtoBufByteOutputStream stream;
-    std::string expected = writeTree(stream, 0);
-    ASSERT_EQ(Finished(stream), expected) << "round " << round;
-  }
 }
 
 // A section of 2^28 bytes needs a five-byte length, one byte more than its markers free, so Finish

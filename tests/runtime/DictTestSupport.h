@@ -29,23 +29,9 @@ inline ref<Dictionary> Read(VekMempool* pool, std::string_view json, std::string
   return result;
 }
 
-// The streaming parser fed `chunks`; the tree is returned even on failure (it may be partial).
 inline ref<Dictionary> Parse(VekMempool* pool, const std::vector<std::string_view>& chunks, bool* isOk,
                              std::string* error = nullptr, const JsonLimits& limits = JsonLimits()) {
-  PDictionary result;
-  JsonParser parser(pool, limits);
-  parser.BeginParse(result);
-  bool ok = true;
-  for (std::string_view chunk : chunks) {
-    if (!parser.ParseChunk(chunk.data(), chunk.size())) {
-      ok = false;
-      break;
-    }
-  }
-  if (ok) ok = parser.EndParse();
-  if (error != nullptr) *error = ok || parser.pErrorTextM == nullptr ? "" : parser.pErrorTextM;
-  *isOk = ok;
-  return result;
+  return sarntest::StreamParse(pool, chunks, isOk, error, limits);
 }
 
 inline ref<Dictionary> Parse(VekMempool* pool, std::string_view json, std::string* error = nullptr,

@@ -26,22 +26,9 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
 }
 
 TEST(JsonWriteTest, QuotesByTheBareRuleAndEscapesExactly) {
-  const struct {
-    std::string text;
-    bool fBareAllowed;
-    std::string json;
-  } cases[] = {
-      {"abc-1", true, "abc-1"}, {"abc-1", false, "\"abc-1\""}, {"-7", true, "-7"}, {"1.5", true, "\"1.5\""},
-      {"", true, "\"\""}, {"", false, "\"\""}, {"a b", true, "\"a b\""},
-      {"\xC3\xA9", true, "\"\xC3\xA9\""},  // non-ASCII letters are not bare
-      {std::string("ab\0c d", 6), true, "ab\\u0000c d"},  // only the bytes before the first NUL decide
-      {"\\u00e9", false, "\"\\u00e9\""},  // a backslash-u passes through
-      {"\\b", false, "\"\\\\b\""}, {"a\\", false, "\"a\\\\\""}, {"\\\\u", false, "\"\\\\\\u\""},
-      {"\x01", false, "\"\\u0001\""}, {"\x1F", false, "\"\\u001F\""}, {std::string("\0", 1), false, "\"\\u0000\""},
-      {"\x03\x1A\x7F/\xC3\xA9", false, "\"\x03\x1A\x7F/\xC3\xA9\""},
-      {"\b\t\n\f\r\"x", false, "\"\\b\\t\\n\\f\\r\\\"x\""}, {"\x0B\x1B", false, "\"\\u000B\\u001B\""},
-  };
-  for (const auto& c : cases) EXPECT_EQ(ToJson(c.text, c.fBareAllowed), c.json) << c.text;
+  for (const auto& row : sarntest::ReadTable("json/string-writer.txt", 3)) {
+    EXPECT_EQ(ToJson(row[0], row[1] == "bare"), row[2]) << row[0];
+  }
 }
 
 TEST(JsonWriteTest, LongTextsAndSinkFailures) {
@@ -59,18 +46,6 @@ TEST(JsonWriteTest, LongTextsAndSinkFailures) {
   StringSink failing;
   failing.fFailM = true;
   EXPECT_FALSE(sarn::Json::StringToJson(VekString("x"), false, failing));
-}
-
-TEST(JsonWriteTest, EscapedCharToChar) {
-  // Each byte after a backslash: its meaning, or 'z' (left alone) when it is no escape.
-  std::string meanings;
-  for (int c = 0; c < 256; ++c) {
-    char result = 'z';
-    bool fOk = sarn::Json::EscapedCharToChar(static_cast<char>(c), result);
-    EXPECT_EQ(fOk, result != 'z') << c;
-    if (fOk) meanings += std::string(1, static_cast<char>(c)) + result;
-  }
-  EXPECT_EQ(meanings, "\"\"//\\\\b\bf\fn\nr\rt\t");
 }
 
 struct ReadResult {
@@ -101,30 +76,9 @@ ReadResult ReadSource(VekMempool* pool, const std::vector<std::string_view>& chu
 }
 
 TEST_F(JsonTextTest, MemoryReaderStringsBareTokensAndFailures) {
-  const struct {
-    std::string input;
-    bool fOk;
-    std::string text;  // "untouched": the result is left alone on failure
-    size_t consumed;   // bytes the cursor moved
-  } cases[] = {
-      {"  \"x\\ty\"rest", true, "x\ty", 8},  // the cursor rests after the closing quote
-      {"-12.5e+3,", true, "-12.5e+3", 8},
-      {"{\"a\":1}", true, "", 0},
-      {" \t\r\n", true, "", 4},
-      {"\f1", true, "", 0},  // form feed is not whitespace
-      {"\"a\\u00e9b\"", true, "a\\u00e9b", 10},
-      {"\"abc", true, "abc", 4},  // the end of the range closes the string
-      {"\"\\/\\\\\\\"\\b\\f\\n\\r\\t|\"", true, "/\\\"\b\f\n\r\t|", 19},
-      {"\"\"x", true, "", 2},
-      {"\"a\\q\"", false, "untouched", 0},
-      {"\"a\\", false, "untouched", 0},
-      {std::string("\"a\0b\"", 5), false, "untouched", 0},
-      {std::string("\"\0\"", 3), false, "untouched", 0},
-      {"\"x\\n\\x\"", false, "untouched", 0},
-  };
-  for (const auto& c : cases) {
-    ReadResult r = ReadMemory(&poolM, c.input);
-    EXPECT_EQ(r.Text(), (ReadResult{c.fOk, c.text, c.fOk ? c.consumed : r.consumed}.Text())) << c.input;
+  for (const auto& row : sarntest::ReadTable("json/string-reader.txt", 2)) {
+    ReadResult r = ReadMemory(&poolM, row[0]);
+    EXPECT_EQ(r.fOk ? r.Text() : "no [" + r.text + "]", row[1]) << row[0];
   }
 }
 

@@ -14,6 +14,7 @@
 #include "sarn/Sarn.h"
 #include "testutil/ObjectFill.h"
 #include "testutil/RandomObject.h"
+#include "testutil/TestStreams.h"
 
 using namespace sarn;
 using google::protobuf::FieldDescriptor;
@@ -125,10 +126,7 @@ void Bridge(const SarnObject* object, Message* out) {
 std::string Marshal(const ProtoBuf& codec, const SarnObject* object, bool isKnown = true) {
   ProtoBufByteOutputStream out;
   isKnown ? codec.MarshalKnownDict(object, &out) : codec.Marshal(object, &out);
-  const unsigned char* data;
-  unsigned long length;
-  out.Finish(data, length);
-  return std::string(reinterpret_cast<const char*>(data), length);
+  return sarntest::Finished(out);
 }
 
 const unsigned char* Bytes(const std::string& s) { return reinterpret_cast<const unsigned char*>(s.data()); }

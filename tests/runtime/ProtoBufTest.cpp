@@ -24,10 +24,7 @@ class ProtoBufTest : public sarntest::PoolTest {
   std::string Write(const std::function<void(const ProtoBuf&, ProtoBufByteOutputStream*)>& write) {
     ProtoBufByteOutputStream out;
     write(Codec(), &out);
-    const unsigned char* data;
-    unsigned long length;
-    out.Finish(data, length);
-    return std::string(reinterpret_cast<const char*>(data), length);
+    return sarntest::Finished(out);
   }
   std::string Known(const SarnObject* object) {
     return Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.MarshalKnownDict(object, out); });
@@ -109,35 +106,12 @@ TEST_F(ProtoBufTest, EveryTypeRoundTrips) {
 }
 
 TEST_F(ProtoBufTest, ReaderRefusesMalformedFieldsAndSkipsUnknownOnes) {
-  const std::string out100 = "field number '100' out of range in 'testAllTypes'\n";
-  const struct {
-    const char* label;
-    std::string bytes;
-    bool isOk;
-    std::string printed;
-  } cases[] = {
-      {"bool 1", "\x20\x01", true, ""},
-      {"bool 2", "\x20\x02", false, ""},
-      {"unknown number, varint", "\xA0\x06\x05\x20\x01", true, out100},
-      {"undefined number", std::string("\x00\x05\x20\x01", 4), true, "field number '0' undefined in 'testAllTypes'\n"},
-      {"unknown number, wire type 5", "\xA5\x06\x01\x02\x03\x04", false, out100},
-      {"unknown number, wire type 3", "\xA3\x06", false, out100},
-      {"unknown number, wire type 4", "\xA4\x06", false, out100},
-      {"unknown number, length past the end", "\xA2\x06\x05\x01", false, out100},
-      {"short float", std::string("\xB1\x01\0\0\0\0\0\0\xF0", 9), false, ""},
-      {"invalid channel number", "\x3A\x07invalid", false, ""},
-      {"invalid currency", "\x52\x07invalid", false, ""},
-      {"string length past the end", "\xE2\x02\x05" "abc", false, ""},
-      {"truncated tag", "\xE2", false, ""},
-      {"sub-object length past the end", "\xBA\x03\x09\x08", false, ""},
-      {"known dict of an unknown type", "\xF2\x02\x03\x82\x01\x00", false, ""},
-  };
-  for (const auto& c : cases) {
+  for (const auto& row : sarntest::ReadTable("binary/reader-fields.txt", 4)) {
     testing::internal::CaptureStdout();
-    ref<SarnObject> object = Read(c.bytes);
-    EXPECT_EQ(testing::internal::GetCapturedStdout(), c.printed) << c.label;
-    EXPECT_EQ(static_cast<bool>(object), c.isOk) << c.label;
-    EXPECT_TRUE(!object || FieldAccess::ScalarValue<uint8_t>(object.Get(), Field(kTestAllTypes, 4), 0) == 1) << c.label;
+    ref<SarnObject> object = Read(row[0]);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), row[2]) << row[3];
+    EXPECT_EQ(object ? "read" : "refused", row[1]) << row[3];
+    EXPECT_TRUE(!object || FieldAccess::ScalarValue<uint8_t>(object.Get(), Field(kTestAllTypes, 4), 0) == 1) << row[3];
   }
   // A MULTI field holds at most 65,535 elements: one more fails the read rather than being dropped.
   std::string full;
@@ -182,24 +156,11 @@ TEST_F(ProtoBufTest, AnyDictsReadBackAndMalformedOnesFail) {
 }
 
 TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
-  // A kernoRpcRequest (tag 975 * 8 + 2 = FA 3C) with rpcId 9 and a cancel as its body.
-  const std::string request = "\xFA\x3C\x09\x18\x12\x12\x05\xF2\x3C\x02\x08\x0A";
-  const std::pair<std::string, const char*> cases[] = {
-      // The text of the error object; null when the envelope reads.
-      {"", "does not start with valid int"},
-      {"\xF2\x3C\x02\x08", "failed to unmarshal"},
-      {"\xF2\x8B\x01", "bad object type: 2238"},
-      {request, nullptr},
-      {"\xFA\x3C\x05\x18\x12", "wrapper did not unmarshal: length"},
-      {"\xFA\x3C\x02\x38\x01", "wrapper did not unmarshal"},
-      {"\xFA\x3C\x02\x08\x02", "wrapper did not unmarshal"},
-      {"\x82\x3D\x02\x20\x01", "wrapper did not unmarshal"},
-  };
-  for (const auto& [bytes, text] : cases) {
-    ref<SarnObject> object = Codec().UnmarshalWrapper(U(bytes), static_cast<int>(bytes.size()));
+  for (const auto& row : sarntest::ReadTable("binary/envelopes.txt", 2)) {
+    ref<SarnObject> object = Codec().UnmarshalWrapper(U(row[0]), static_cast<int>(row[0].size()));
     ASSERT_TRUE(object);
-    if (text != nullptr) {
-      EXPECT_EQ(ErrorText(object), text) << testing::PrintToString(bytes);
+    if (row[1] != "reads") {
+      EXPECT_EQ(ErrorText(object), row[1]) << testing::PrintToString(row[0]);
       continue;
     }
     auto* wrapper = static_cast<sarnschema::KernoRpcRequest*>(object.Get());

@@ -4,7 +4,6 @@
 #include "sarn/Sarn.h"
 #include "testutil/TestUtil.h"
 
-#include <map>
 #include <memory>
 
 namespace {
@@ -91,9 +90,7 @@ const std::string kExampleEvents =
     "header [RequestType] [kernoCurrentTimeGet] | header [ResponseCount] [single] | header [RpcId] [7] | "
     "header [SchemaVersion] [42] | header [Type] [request] | body " + kBody;
 
-const std::string kInvalidFirstLine = "error RpcV2Parser: The first line of the message is invalid";
 const std::string kInvalidHeaderSize = "error RpcV2Parser: The declared header length is invalid";
-const std::string kFirstLineSize = "error RpcV2Parser: The length of the first line exceeds the 25 characters limit";
 const std::string kRefused = " | parse false | end true";
 
 TEST(RpcV2ParserTest, WorkedExampleGivesTheSameCallbacksHoweverSplit) {
@@ -114,73 +111,18 @@ TEST(RpcV2ParserTest, WorkedExampleGivesTheSameCallbacksHoweverSplit) {
             std::vector<long>({RpcV2Parser::StateDone, 135, 31, RpcV2Parser::MessageTypeRequest, 3}));
 }
 
-TEST(RpcV2ParserTest, FirstLine) {
-  const std::string endOfFirstLine = "parse true | error RpcV2Parser: Unexpected end of first line | end false | "
-                                     "error RpcV2Parser: Unexpected end of first line";
-  const std::string bodyLength = "error RpcV2Parser: The declared body length is invalid";
-  const std::string tail = "\r\nType: cancel\r\nRpcId: 1\r\n\r\n";  // 26 header bytes
-  const std::string cancel =
-      "headerSize 26 | bodySize 0 | header [Type] [cancel] | header [RpcId] [1] | parse true | end true";
-  const std::pair<std::string, std::string> cases[] = {
-      {"MRPC/2 0 5\r\n", kInvalidHeaderSize + kRefused},
-      {"MRPC/2 -27 0\r\n", kInvalidHeaderSize + kRefused},
-      {"MRPC/2 1048577 0\r\n", kInvalidHeaderSize + kRefused},
-      {"MRPC/2 10 5242881\r\n", "headerSize 10 | " + bodyLength + kRefused},
-      {"MRPC/2 10 -1\r\n", "headerSize 10 | " + bodyLength + kRefused},
-      {"MRPC/2 1048576 5242880\r\n",
-       "headerSize 1048576 | bodySize 5242880 | parse true | error RpcV2Parser: Unexpected end of header | end false | "
-       "error RpcV2Parser: Unexpected end of header"},
-      // The blanks match any run of white space, none included; numbers may carry a sign.
-      {"MRPC/226\t-0" + tail, cancel},
-      {"MRPC/2 +26 0" + tail, cancel},
-      // Exactly 25 bytes with CR LF is the longest first line.
-      {"MRPC/2 0000000000026 000" + tail, kFirstLineSize + kRefused},
-      {"MRPC/2 000000000026 000" + tail, cancel},
-      {"MRPC/2 10 20x\r\n", kInvalidFirstLine + kRefused},
-      {"MRPC/2 10 20 30\r\n", kInvalidFirstLine + kRefused},
-      {"MRPC/2 10 20 \r\n", kInvalidFirstLine + kRefused},
-      {"MRPC/2 10\r\n", kInvalidFirstLine + kRefused},
-      {"MRPC/2 + 10 20\r\n", kInvalidFirstLine + kRefused},
-      {"MRPC/1 10 20\r\n", kInvalidFirstLine + kRefused},
-      {std::string("MRPC/2 10\0 20\r\n", 15), kInvalidFirstLine + kRefused},
-      // A lone LF does not end the line; 25 bytes without CR LF are refused at once.
-      {"MRPC/2 10 20\nabcdefghijkl", kFirstLineSize + kRefused},
-      {"MRPC/2 1 2 xxxxxxxxxxxxxx\r\n", kFirstLineSize + kRefused},
-      {"MRPC/2 1 2 xxxxxxxxxxxx", endOfFirstLine},
-      {"", endOfFirstLine},
-  };
-  for (const auto& [input, log] : cases) {
-    SCOPED_TRACE(input);
-    ExpectLog(input, log);
+TEST(RpcV2ParserTest, FirstLineAndHeaderLines) {
+  for (const auto& row : sarntest::ReadTable("rpc/first-line.txt", 2)) {
+    SCOPED_TRACE(row[0]);
+    ExpectLog(row[0], row[1]);
   }
-}
-
-TEST(RpcV2ParserTest, HeaderLinesAreTrimmedAndChecked) {
-  const std::string rpcId = "error RpcV2Parser: Invalid RpcId value";
-  const std::string contentType = "error RpcV2Parser: Invalid Content-Type value";
-  const std::string count = "error RpcV2Parser: Invalid ResponseCount value";
-  const std::string type = "error RpcV2Parser: Invalid Type value";
-  const std::string line = "error RpcV2Parser: Invalid header line";
-  // What the line adds, or its error. Empty and all-white-space values are the empty string for
-  // every key.
-  const std::pair<std::string, std::string> cases[] = {
-      {" \tX-Key \t:  a: b \t", "header [X-Key] [a: b]"}, {"X-Key:a\nb", "header [X-Key] [a\nb]"},
-      {"rpcid: x", "header [rpcid] [x]"}, {": v", "header [] [v]"}, {std::string("X-Key: a\0b", 10), "header [X-Key] [a]"},
-      {"X-Key:", "header [X-Key] []"}, {"RequestType: \t ", "header [RequestType] []"}, {"RpcId:", "header [RpcId] []"},
-      {"RpcId:  ", "header [RpcId] []"}, {"RpcId: 0042", "header [RpcId] [0042]"}, {"RpcId: 12a", rpcId},
-      {"RpcId: -1", rpcId}, {"Content-Type: application/json", "header [Content-Type] [application/json]"},
-      {"Content-Type: application/json; charset=utf-8", contentType}, {"Content-Type: Application/json", contentType},
-      {"Content-Type:  ", contentType}, {"ResponseCount: none", "header [ResponseCount] [none]"},
-      {"ResponseCount: multiple", "header [ResponseCount] [multiple]"}, {"ResponseCount: Single", count},
-      {"ResponseCount:", count}, {"Type: Request", type}, {"Type: ", type}, {"abc", line},
-      {std::string("ab\0:c", 5), line},
-  };
-  for (const auto& [text, added] : cases) {
-    SCOPED_TRACE(text);
-    const std::string block = Block({"RpcId: 1", "Type: response", text});
-    const bool isError = added.rfind("error", 0) == 0;
+  // One line after two good ones: what it adds to the log, or its error.
+  for (const auto& row : sarntest::ReadTable("rpc/header-lines.txt", 2)) {
+    SCOPED_TRACE(row[0]);
+    const std::string block = Block({"RpcId: 1", "Type: response", row[0]});
+    const bool isError = row[1].rfind("error", 0) == 0;
     ExpectLog(Frame(block, "{}"), "headerSize " + std::to_string(block.size()) +
-                                      " | bodySize 2 | header [RpcId] [1] | header [Type] [response] | " + added +
+                                      " | bodySize 2 | header [RpcId] [1] | header [Type] [response] | " + row[1] +
                                       (isError ? kRefused : " | body {} | complete | parse true | end true"));
   }
 }
@@ -213,40 +155,16 @@ TEST(RpcV2ParserTest, HeaderBlockBoundaries) {
 }
 
 TEST(RpcV2ParserTest, HeaderBlockRequirementsInOrder) {
-  const std::map<std::string, std::string> texts = {
-      {"MissingRpcId", "RpcV2Parser: Missing RpcId value"},
-      {"MissingType", "RpcV2Parser: Missing Type value"},
-      {"UnexpectedBody", "RpcV2Parser: 'cancel' should not have a body"},
-      {"MissingBody", "RpcV2Parser: The declared body length is zero for non-cancel message type"},
-      {"MissingResponseCount", "RpcV2Parser: Missing ResponseCount value"},
-      {"MissingRequestType", "RpcV2Parser: Missing RequestType value"},
-  };
-  const struct {
-    std::string block;
-    size_t bodyLength;
-    const char* error;  // nullptr: accepted
-  } cases[] = {
-      {Block({"Type: request"}), 2, "MissingRpcId"},
-      {Block({"X: y"}), 0, "MissingRpcId"},
-      {Block({"RpcId: 1"}), 2, "MissingType"},
-      {Block({"RpcId: 1", "Type: cancel"}), 3, "UnexpectedBody"},
-      {Block({"RpcId: 1", "Type: response"}), 0, "MissingBody"},
-      {Block({"RpcId: 1", "Type: request"}), 0, "MissingBody"},
-      {Block({"RpcId: 1", "Type: request"}), 2, "MissingResponseCount"},
-      {Block({"RpcId: 1", "Type: request", "ResponseCount: none"}), 2, "MissingRequestType"},
-      {Block({"RpcId: 1", "Type: requestUpdate", "ResponseCount: none"}), 2, "MissingRequestType"},
-      {Block({"RpcId: 1", "Type: requestUpdate", "RequestType:"}), 2, nullptr},
-      {Block({"RpcId: 1", "Type: request", "RequestType: x", "ResponseCount: none"}), 2, nullptr},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.block);
-    const std::string frame = Frame(c.block, std::string(c.bodyLength, '7'));
+  for (const auto& row : sarntest::ReadTable("rpc/header-block.txt", 3)) {
+    SCOPED_TRACE(row[0]);
+    const size_t bodyLength = std::stoul(row[1]);
+    const std::string frame = Frame(row[0] + "\r\n\r\n", std::string(bodyLength, '7'));
     const std::vector<std::string> events = Feed({frame}).eventsM;
     ASSERT_GE(events.size(), 3u);
-    EXPECT_EQ(events[events.size() - 3], c.error == nullptr ? "complete" : "error " + texts.at(c.error));
+    EXPECT_EQ(events[events.size() - 3], row[2]);
     // Judged as soon as the block is complete, before any body byte is looked at.
-    EXPECT_TRUE(c.error == nullptr ||
-                Feed({std::string_view(frame).substr(0, frame.size() - c.bodyLength)}).eventsM == events);
+    EXPECT_TRUE(row[2] == "complete" ||
+                Feed({std::string_view(frame).substr(0, frame.size() - bodyLength)}).eventsM == events);
   }
 }
 
@@ -299,23 +217,6 @@ TEST(RpcV2ParserTest, EndParseAndDestructorInEveryState) {
     EXPECT_TRUE(judged.EndParse());
   }
   EXPECT_EQ(log.Text(), kInvalidHeaderSize);
-}
-
-TEST(RpcV2ParserTest, LargeBodyStreamsThroughWithoutCopies) {
-  const std::string body(RpcV2Parser::BODY_LENGTH_LIMIT, 'b');
-  const std::string frame = Frame(Block({"RpcId: 1", "Type: response"}), body);
-  Recorder log;
-  RpcV2Parser parser(log);
-  size_t chunks = 0;
-  for (std::string_view chunk : sarntest::FixedChunks(frame, 512)) {
-    ASSERT_TRUE(parser.ParseChunk(chunk.data(), chunk.size()));
-    ASSERT_TRUE(parser.bodyBytesReadM == 0 ||
-                (log.lastBodyChunkM >= chunk.data() && log.lastBodyChunkM < chunk.data() + chunk.size()));
-    ++chunks;
-  }
-  EXPECT_TRUE(parser.bodyBytesReadM == body.size() && parser.stateM == RpcV2Parser::StateDone);
-  EXPECT_EQ(log.eventsM[log.eventsM.size() - 2], "body " + body);
-  EXPECT_EQ(log.piecesM, chunks);  // the first chunk holds the head and the body's start
 }
 
 }  // namespace

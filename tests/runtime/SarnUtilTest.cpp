@@ -1,4 +1,6 @@
 #include <string>
+#include <tuple>
+#include <vector>
 
 #include "sarn/Sarn.h"
 #include "testutil/TestUtil.h"
@@ -19,20 +21,28 @@ TEST(SarnUtilTest, NamespaceOfALongId) {
   }
 }
 
+// The schema's lookups and their text forms agree: the name of a number (none for unused numbers,
+// numbers past nValue, ids past the table and type ids), the number of a name (untouched when
+// refused).
 TEST(SarnUtilTest, EnumNamesAndNumbers) {
-  EXPECT_EQ(Str(SarnUtil::EnumNumberToName(682, 2)) + "|" + Str(SarnUtil::EnumNumberToName(692, 0)) + "|" +
-                Str(SarnUtil::EnumNumberToName(692, 6)) + "|" + Str(SarnUtil::EnumNumberToName(692, 7)) + "|" +
-                Str(SarnUtil::EnumNumberToName(sarn::Schema::nEnumDefG, 0)) + "|" + Str(SarnUtil::EnumNumberToName(-1, 0)),
-            "cable|sunday|saturday|||");
-  unsigned int number = 0;
-  EXPECT_TRUE(SarnUtil::EnumNameToNumber(682, VekString("cable"), number));
-  EXPECT_EQ(number, 2u);
-  number = 99;
-  EXPECT_FALSE(SarnUtil::EnumNameToNumber(692, VekString(""), number));
-  EXPECT_FALSE(SarnUtil::EnumNameToNumber(692, VekString("Sunday"), number));
-  EXPECT_FALSE(SarnUtil::EnumNameToNumber(-1, VekString("cable"), number));
-  EXPECT_FALSE(SarnUtil::EnumNameToNumber(sarn::Schema::nEnumDefG, VekString("cable"), number));
-  EXPECT_EQ(number, 99u);
+  const std::pair<long, unsigned> numbers[] = {{682, 2}, {692, 0}, {692, 6}, {692, 7}, {702, 0}, {714, 3},
+                                               {sarn::Schema::nEnumDefG, 0}, {-1, 0}, {191, 0}};
+  std::string names;
+  for (const auto& [id, n] : numbers) {
+    const char* name = sarn::EnumNumberName(id, n);
+    names += std::string(name != nullptr ? name : "") + "|";
+    EXPECT_EQ(Str(SarnUtil::EnumNumberToName(static_cast<int>(id), n)), name != nullptr ? name : "") << id;
+  }
+  EXPECT_EQ(names, "cable|sunday|saturday|||||||");
+  const std::tuple<long, const char*, unsigned> lookups[] = {
+      {682, "cable", 2}, {714, "high", 2}, {1361, "address", 191}, {692, "", 99}, {692, "Sunday", 99},
+      {714, "huge", 99}, {-1, "cable", 99}, {sarn::Schema::nEnumDefG, "cable", 99}};
+  for (const auto& [id, name, expected] : lookups) {
+    unsigned int number = 99, viaText = 99;
+    EXPECT_EQ(sarn::EnumNameNumber(id, name, number), expected != 99) << name;
+    EXPECT_EQ(SarnUtil::EnumNameToNumber(static_cast<int>(id), VekString(name), viaText), expected != 99) << name;
+    EXPECT_EQ(std::vector<unsigned>({number, viaText}), std::vector<unsigned>({expected, expected})) << name;
+  }
   // Unused numbers of an enum never match and have no name.
   for (int id = 0; id < sarn::Schema::nEnumDefG; ++id) {
     const sarn::EnumDef* def = sarn::Schema::vEnumDefG[id];

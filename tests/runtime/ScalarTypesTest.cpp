@@ -41,25 +41,32 @@ class ScalarTypesTest : public ::testing::TestWithParam<const char*> {
 
 INSTANTIATE_TEST_SUITE_P(FarZones, ScalarTypesTest, ::testing::Values("EAST-14", "WEST+12"));
 
-TEST_P(ScalarTypesTest, ChannelNumbers) {
-  const struct {
-    std::string text;
-    ChannelNumber value;
-    const char* printed;
-  } cases[] = {
-      {"5", ChannelNumber(5), "5"}, {"5-1", ChannelNumber(5, 1), "5-1"}, {"5-0", ChannelNumber(5, 0), "5-0"},
-      {"05", ChannelNumber(5), "5"}, {"-5", ChannelNumber::INVALID, "invalid"}, {" 5", ChannelNumber::INVALID, "invalid"},
-      {"5-", ChannelNumber::INVALID, "invalid"}, {"5-x", ChannelNumber::INVALID, "invalid"},
-      {"5-1x", ChannelNumber::INVALID, "invalid"}, {"", ChannelNumber::INVALID, "invalid"},
-      {"5--1", ChannelNumber::INVALID, "invalid"}, {"5-1-2", ChannelNumber::INVALID, "invalid"},
-      {"4294967301", ChannelNumber(5), "5"},  // strtol's value cut to 32 bits
-      {std::string("5\0-x", 4), ChannelNumber(5), "5"},  // read up to the NUL
-  };
-  for (const auto& c : cases) {
-    ChannelNumber parsed = ChannelNumber::Parse(Text(c.text));
-    EXPECT_EQ(parsed, c.value) << c.text;
-    EXPECT_EQ(Str(parsed.ToString()), c.printed) << c.text;
+// Each text parsed as its kind; channel numbers and currencies also read back from what they print.
+TEST_P(ScalarTypesTest, ParsedTexts) {
+  for (const auto& row : sarntest::ReadTable("values/scalar-texts.txt", 3)) {
+    const std::string& kind = row[0];
+    const VekString text = Text(row[1]);
+    std::string value;
+    if (kind == "channel") {
+      ChannelNumber parsed = ChannelNumber::Parse(text);
+      value = Str(parsed.ToString());
+      EXPECT_EQ(ChannelNumber::Parse(parsed.ToString()), parsed) << row[1];
+    } else if (kind == "currency") {
+      Currency parsed = Currency::Parse(text);
+      value = Str(parsed.ToString());
+      EXPECT_EQ(Currency::Parse(parsed.ToString()), parsed) << row[1];
+    } else if (kind == "date") {
+      value = std::to_string(Date::Parse(text).daysM);
+    } else if (kind == "time") {
+      value = std::to_string(Time::Parse(text).millisecondsM);
+    } else {
+      value = std::to_string(DateTime::Parse(text).millisecondsM);
+    }
+    EXPECT_EQ(value, row[2]) << kind << " " << row[1];
   }
+}
+
+TEST_P(ScalarTypesTest, ChannelNumbers) {
   EXPECT_EQ(Str(ChannelNumber(-2, 7).ToString()), "-2-7");
   EXPECT_EQ(Str(ChannelNumber(-1).ToString()), "-1");
   EXPECT_EQ(ChannelNumber(), ChannelNumber::INVALID);
@@ -72,14 +79,8 @@ TEST_P(ScalarTypesTest, ChannelNumbers) {
 TEST_P(ScalarTypesTest, Currencies) {
   Currency usd = Currency::Parse(Text("USD.1999"));
   EXPECT_TRUE(usd.amountM == 1999 && std::string(usd.codeM) == "USD");
-  EXPECT_EQ(Str(usd.ToString()), "USD.1999");
   EXPECT_EQ(usd, Currency(1999, "USD"));
   EXPECT_NE(usd, Currency(1999, "EUR"));
-  for (std::string bad : {"USD.-5", "USD.", "US.5", "USD.5x", "USD5", "", "USD.2147483648", "USD. 5"}) {
-    EXPECT_EQ(Currency::Parse(Text(bad)), Currency::INVALID) << bad;
-  }
-  EXPECT_EQ(Currency::Parse(Text(std::string("U\0D.5", 5))), Currency::INVALID) << "a code with a NUL is not 3 long";
-  EXPECT_EQ(Currency::Parse(Text("USD.2147483647")).amountM, 2147483647);
   EXPECT_EQ(Currency(5, "EURO"), Currency::INVALID);
   EXPECT_EQ(Str(Currency(5, "EURO").ToString()), "invalid");
   EXPECT_EQ(Currency(5, nullptr), Currency::INVALID);
@@ -92,19 +93,8 @@ TEST_P(ScalarTypesTest, Currencies) {
   EXPECT_EQ(Str(full.ToString()), "ABCD.1") << "a code without NUL is read within its bytes";
 }
 
-// Text to value (-1 for the zero value of a refusal) and value back to text.
+// Zero values, value to text, and text to value over the whole range of years.
 TEST_P(ScalarTypesTest, DatesTimesAndDateTimes) {
-  const std::pair<std::string, long long> dates[] = {
-      {"1970-01-02", 1}, {"1969-12-31", -1}, {"2021-03-04", 18690}, {"2021-03-04x", 0}, {"2021-03-04 ", 0},
-      {"2021-13-04", 0}, {"", 0}, {std::string("2021-03-04\0x", 12), 18690}};
-  for (const auto& [text, days] : dates) EXPECT_EQ(Date::Parse(Text(text)).daysM, days) << text;
-  const std::pair<std::string, long long> times[] = {{"00:00:01", 1000}, {"23:59:59", 86399000}, {"13:05:09", 47109000},
-                                                     {"24:00:00", 0}, {"13:05", 0}, {"13:05:09.5", 0}};
-  for (const auto& [text, ms] : times) EXPECT_EQ(Time::Parse(Text(text)).millisecondsM, ms) << text;
-  const std::pair<std::string, long long> dateTimes[] = {
-      {"2021-03-04 13:05:09", 1614863109000}, {"2021-03-04T13:05:09", 1614863109000}, {"2021-03-04", 0},
-      {"2021-03-04t13:05:09", 0}, {"2021-03-04 13:05:09Z", 0}, {"1969-12-31 23:59:59", -1000}};
-  for (const auto& [text, ms] : dateTimes) EXPECT_EQ(DateTime::Parse(Text(text)).millisecondsM, ms) << text;
   EXPECT_TRUE(Date::Parse(Text("")) == Date::ZERO && Time::Parse(Text("24:00:00")) == Time::ZERO &&
               DateTime::Parse(Text("2021-03-04")) == DateTime::ZERO && Date(1) != Date::ZERO && Time(1) != Time::ZERO &&
               DateTime(1) != DateTime::ZERO);

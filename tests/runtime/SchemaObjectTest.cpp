@@ -134,19 +134,3 @@ TEST_F(SchemaObjectTest, SetDebugLockOwnerReachesStringArrays) {
   }
   EXPECT_EQ(arrays, 9);
 }
-
-TEST(SchemaEnums, NamesAndNumbers) {
-  // Unused numbers, numbers beyond nValue, ids past the table and type ids have no name.
-  EXPECT_STREQ(EnumNumberName(682, 2), "cable");
-  for (const auto& [id, number] : std::vector<std::pair<long, unsigned>>{{702, 0}, {714, 3}, {Schema::nEnumDefG, 0}, {-1, 0}, {191, 0}}) {
-    EXPECT_EQ(EnumNumberName(id, number), nullptr) << id << " " << number;
-  }
-  unsigned int number = 1234;
-  EXPECT_FALSE(EnumNameNumber(714, "huge", number));
-  EXPECT_FALSE(EnumNameNumber(Schema::nEnumDefG, "high", number));
-  EXPECT_EQ(number, 1234u);
-  EXPECT_TRUE(EnumNameNumber(714, "high", number));
-  EXPECT_EQ(number, 2u);
-  EXPECT_TRUE(EnumNameNumber(1361, "address", number));
-  EXPECT_EQ(number, 191u);
-}

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
+#include "testutil/ObjectFill.h"
 
 namespace sarntest {
 
@@ -62,7 +63,7 @@ class RandomObjects {
       case SARN_DATA_TYPE_TIME: return Put(object, field, Time{static_cast<int>(Next(86400)) * 1000});
       case SARN_DATA_TYPE_DATETIME:
         return Put(object, field, DateTime{(static_cast<long long>(Next(8000000000ull)) - 4000000000ll) * 1000});
-      case SARN_DATA_TYPE_ENUM: return Put(object, field, NamedEnumValue(field.refIndex));
+      case SARN_DATA_TYPE_ENUM: return Put(object, field, SomeEnumValue(field.refIndex, static_cast<unsigned>(Next())));
       case SARN_DATA_TYPE_S32:
         return Put(object, field, Next(2) ? kS32[Next(5)] : static_cast<int32_t>(static_cast<uint32_t>(Next())));
       case SARN_DATA_TYPE_INT_ID:
@@ -117,16 +118,6 @@ class RandomObjects {
   bool Put(sarn::SarnObject* object, const sarn::FieldInfo& field, T value) {
     sarn::FieldAccess::PutScalar(object, field, &value);
     return true;
-  }
-
-  uint32_t NamedEnumValue(unsigned enumId) {
-    const sarn::EnumDef* def = sarn::EnumDefForId(enumId);
-    if (def == nullptr || def->nValue == 0) return 0;
-    for (uint64_t start = Next(def->nValue), k = 0; k < def->nValue; ++k) {
-      uint64_t i = (start + k) % def->nValue;
-      if (def->vName[i] != nullptr) return static_cast<uint32_t>(i);
-    }
-    return 0;
   }
 
   // Zero to twelve characters: letters, digits, and what JSON escapes or keeps as is.

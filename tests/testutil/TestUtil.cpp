@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cstdio>
 #include <cstring>
 #include <cstdlib>
@@ -17,12 +18,6 @@ void ForEachSplit(std::string_view input,
   for (size_t at = 0; at <= input.size(); ++at) {
     feed({input.substr(0, at), input.substr(at)}, "split at " + std::to_string(at));
   }
-}
-
-std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
-  std::vector<std::string_view> chunks;
-  for (size_t at = 0; at < input.size(); at += size) chunks.push_back(input.substr(at, size));
-  return chunks;
 }
 
 void RunOnStack(size_t bytes, const std::function<void()>& work) {
@@ -40,16 +35,6 @@ void RunOnStack(size_t bytes, const std::function<void()>& work) {
   ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
   pthread_join(thread, nullptr);
   pthread_attr_destroy(&attributes);
-}
-
-size_t TestSource::Read(void* buffer, size_t size) {
-  ++nReadM;
-  while (indexM < chunksM.size() && offsetM == chunksM[indexM].size()) ++indexM, offsetM = 0;
-  if (indexM == chunksM.size()) return 0;
-  size_t n = std::min(size, chunksM[indexM].size() - offsetM);
-  std::memcpy(buffer, chunksM[indexM].data() + offsetM, n);
-  offsetM += n;
-  return n;
 }
 
 std::string CorpusDir(const std::string& name) {
@@ -70,6 +55,55 @@ bool ReadFile(const std::string& path, std::string& out) {
   while ((n = std::fread(block, 1, sizeof block, file)) > 0) out.append(block, n);
   std::fclose(file);
   return true;
+}
+
+namespace {
+
+std::string Unescape(const std::string& text) {
+  static const std::string kFrom = "\\nrt0", kTo = std::string("\\\n\r\t\0", 5);
+  std::string out;
+  for (size_t i = 0; i < text.size(); ++i) {
+    size_t k = i + 1 < text.size() && text[i] == '\\' ? kFrom.find(text[i + 1]) : std::string::npos;
+    if (k != std::string::npos) {
+      out += kTo[k], ++i;
+    } else if (text.compare(i, 2, "\\x") == 0 && i + 3 < text.size() && std::isxdigit(text[i + 2]) &&
+               std::isxdigit(text[i + 3])) {
+      out += static_cast<char>(std::stoi(text.substr(i + 2, 2), nullptr, 16)), i += 3;
+    } else {
+      out += text[i];
+    }
+  }
+  return out;
+}
+
+}  // namespace
+
+std::vector<std::vector<std::string>> ReadTable(const std::string& name, size_t nFields) {
+  const char* root = std::getenv("SARN_SOURCE_DIR");
+  std::string text;
+  std::vector<std::vector<std::string>> rows;
+  if (!ReadFile(std::string(root != nullptr ? root : ".") + "/tests/data/" + name, text)) {
+    ADD_FAILURE() << "cannot read tests/data/" << name;
+    return rows;
+  }
+  size_t lineNumber = 0;
+  for (size_t at = 0; at < text.size(); ++lineNumber) {
+    size_t end = std::min(text.find('\n', at), text.size());
+    std::string line = text.substr(at, end - at);
+    at = end + 1;
+    if (line.empty() || line[0] == '#') continue;
+    std::vector<std::string> fields;
+    for (size_t from = 0;;) {
+      size_t cut = line.find(" => ", from);
+      fields.push_back(Unescape(line.substr(from, cut - from)));
+      if (cut == std::string::npos) break;
+      from = cut + 4;
+    }
+    if (fields.size() != nFields) ADD_FAILURE() << name << ":" << lineNumber + 1 << ": " << fields.size() << " fields";
+    else rows.push_back(std::move(fields));
+  }
+  if (rows.empty()) ADD_FAILURE() << "no cases in tests/data/" << name;
+  return rows;
 }
 
 }  // namespace sarntest

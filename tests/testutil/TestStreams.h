@@ -1,0 +1,99 @@
+// Byte helpers without GoogleTest, shared by the tests and the fuzz targets: the bytes of strings,
+// buffers and finished binary streams, inputs cut into chunks, a byte source and a byte sink.
+#pragma once
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "sarn/Sarn.h"
+
+namespace sarntest {
+
+// A fuzz target reports a broken oracle by crashing, which libFuzzer and the replay both catch.
+inline void Require(bool condition) {
+  if (!condition) std::abort();
+}
+
+// The bytes of a string or a byte string, NUL bytes included.
+inline std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
+inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
+  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
+}
+
+// What a binary stream holds once finished.
+inline std::string Finished(sarn::ProtoBufByteOutputStream& stream) {
+  const unsigned char* data;
+  unsigned long length;
+  stream.Finish(data, length);
+  return std::string(reinterpret_cast<const char*>(data), length);
+}
+
+// Splits `input` into chunks of `size` bytes (the last one shorter).
+inline std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
+  std::vector<std::string_view> chunks;
+  for (size_t at = 0; at < input.size(); at += size) chunks.push_back(input.substr(at, size));
+  return chunks;
+}
+
+// The streaming JSON parser fed `chunks`, stopping at the first refusal; the tree is returned even
+// on failure (it may be partial), with the parser's message in `error` ("" on success).
+inline ref<sarn::Dictionary> StreamParse(VekMempool* pool, const std::vector<std::string_view>& chunks, bool* isOk,
+                                         std::string* error = nullptr,
+                                         const sarn::JsonLimits& limits = sarn::JsonLimits()) {
+  sarn::PDictionary result;
+  sarn::JsonParser parser(pool, limits);
+  parser.BeginParse(result);
+  bool ok = true;
+  for (size_t i = 0; ok && i < chunks.size(); ++i) ok = parser.ParseChunk(chunks[i].data(), chunks[i].size());
+  *isOk = ok && parser.EndParse();
+  if (error != nullptr) *error = *isOk || parser.pErrorTextM == nullptr ? "" : parser.pErrorTextM;
+  return result;
+}
+
+// A byte source that hands out the given chunks, one per Read (a chunk larger than the request
+// goes in pieces), counts its reads, reports an error at its end when `isFailing`, and adds one
+// to `*pDeleted` when it is deleted.
+class TestSource : public wynbaselib::Bytesource {
+ public:
+  TestSource(const std::vector<std::string_view>& chunks, int* pDeleted = nullptr, bool isFailing = false)
+      : chunksM(chunks.begin(), chunks.end()), pDeletedM(pDeleted), isFailingM(isFailing) {}
+  ~TestSource() override {
+    if (pDeletedM != nullptr) ++*pDeletedM;
+  }
+  size_t Read(void* buffer, size_t size) override {
+    ++nReadM;
+    while (indexM < chunksM.size() && offsetM == chunksM[indexM].size()) ++indexM, offsetM = 0;
+    if (indexM == chunksM.size()) return 0;
+    size_t n = std::min(size, chunksM[indexM].size() - offsetM);
+    std::memcpy(buffer, chunksM[indexM].data() + offsetM, n);
+    offsetM += n;
+    return n;
+  }
+  Bytesource* Duplicate() override { return nullptr; }
+  bool FError() const override { return isFailingM; }
+  const char* GetErrorText() const override { return isFailingM ? "truncated stream" : ""; }
+  int nReadM = 0;
+
+ private:
+  std::vector<std::string> chunksM;
+  size_t indexM = 0, offsetM = 0;
+  int* pDeletedM;
+  bool isFailingM;
+};
+
+// A sink that keeps what it is given; with `fFailM` set every write and flush fails.
+struct StringSink : wynbaselib::Bytesink {
+  bool Write(const char* data, size_t size) override {
+    textM.append(data, size);
+    return !fFailM;
+  }
+  bool Flush() override { return !fFailM; }
+  std::string textM;
+  bool fFailM = false;
+};
+
+}  // namespace sarntest
