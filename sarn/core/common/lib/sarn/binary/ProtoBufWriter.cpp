@@ -5,8 +5,8 @@
 #include <cstdint>
 #include <cstring>
 
-#include "sarn/binary/GoogleInt.h"
 #include "sarn/binary/ProtoBuf.h"
+#include "sarn/binary/internal/Varint.h"
 #include "sarn/model/FieldAccess.h"
 #include "sarn/model/internal/ObjectWalk.h"
 #include "sarn/values/ScalarTypes.h"
@@ -33,7 +33,7 @@ ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, 
 // The tag and sections of a known dict: the type id (0 for no object) as a known-dict tag, then
 // the fields in a section.
 void OpenKnownDictValue(const SarnObject* object, Out* out) {
-  GoogleInt::WriteGoogleU32((object != nullptr ? object->GetTypeId() : 0) * 8 + 2, out);
+  internal::AppendVarint((object != nullptr ? object->GetTypeId() : 0u) * 8 + 2, out);
   out->StartSection();
 }
 
@@ -82,28 +82,28 @@ class ProtoBuf::Writer {
       return true;
     }
     int64_t tag = frame.dataM.fieldTagM;
-    if (tag != kNoTag) GoogleInt::WriteGoogleU32(static_cast<unsigned int>(tag), outM);
+    if (tag != kNoTag) internal::AppendVarint(static_cast<unsigned int>(tag), outM);
     switch (field.dataType) {
       case SARN_DATA_TYPE_BOOL:
-        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0 ? 1 : 0, outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0 ? 1u : 0u, outM);
         return true;
       case SARN_DATA_TYPE_DATE:
       case SARN_DATA_TYPE_S32:
-        GoogleInt::WriteGoogleS32(FieldAccess::ScalarValue<int32_t>(object, field, i), outM);
+        internal::AppendZigZag32(FieldAccess::ScalarValue<int32_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_DATETIME:
       case SARN_DATA_TYPE_S64:
-        GoogleInt::WriteGoogleS64(FieldAccess::ScalarValue<int64_t>(object, field, i), outM);
+        internal::AppendZigZag64(FieldAccess::ScalarValue<int64_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_ENUM:
       case SARN_DATA_TYPE_TIME:
       case SARN_DATA_TYPE_INT_ID:
       case SARN_DATA_TYPE_U32:
-        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint32_t>(object, field, i), outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint32_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_LONG_ID:
       case SARN_DATA_TYPE_U64:
-        GoogleInt::WriteGoogleU64(FieldAccess::ScalarValue<uint64_t>(object, field, i), outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint64_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_FLOAT: {
         uint64_t bits = FieldAccess::ScalarValue<uint64_t>(object, field, i);
