@@ -126,8 +126,7 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeA
   for (;;) {
     // Plain data up to the previous 0x64 moves a word at a time: a word without the marker whole
     // (it is loaded before it is stored, and `write` never falls below `read`, so the overlap is
-    // harmless), and of the word holding it only the bytes after it, blended into the word below
-    // `write` (whose other bytes are stored back unchanged).
+    // harmless), and of the word holding it the bytes after the marker.
     bool isMarker = false;
     while (read >= 8) {
       uint64_t word;
@@ -140,7 +139,16 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeA
         continue;
       }
       unsigned after = static_cast<unsigned>(__builtin_clzll(markers)) >> 3;  // 0 to 7
-      if (after != 0) {
+      if (write - read >= 8) {
+        // The usual case, once a few markers are behind: the whole word stored, its bytes up to
+        // the marker landing below `write` where nothing unread lies and later output goes.
+        std::memcpy(bytes + write - 8, &word, 8);
+        read -= after;
+        write -= after;
+      } else if (after != 0) {
+        // Close to the unread bytes: only the bytes after the marker are blended into the word
+        // below `write`, whose other bytes are stored back as they were. (Not the usual path: a
+        // load of bytes stored one at a time just before waits for those stores.)
         uint64_t below;
         std::memcpy(&below, bytes + write - 8, 8);
         uint64_t high = ~0ull << (64 - 8 * after);
