@@ -128,6 +128,7 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeA
     // (it is loaded before it is stored, and `write` never falls below `read`, so the overlap is
     // harmless), and of the word holding it the bytes after the marker.
     bool isMarker = false;
+    int code = -1;  // the pair's code byte when the word held it
     while (read >= 8) {
       uint64_t word;
       std::memcpy(&word, bytes + read - 8, 8);
@@ -141,8 +142,10 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeA
       unsigned after = static_cast<unsigned>(__builtin_clzll(markers)) >> 3;  // 0 to 7
       if (write - read >= 8) {
         // The usual case, once a few markers are behind: the whole word stored, its bytes up to
-        // the marker landing below `write` where nothing unread lies and later output goes.
+        // the marker landing below `write` where nothing unread lies and later output goes; the
+        // code byte before the marker is taken from the word rather than loaded again.
         std::memcpy(bytes + write - 8, &word, 8);
+        if (after < 7) code = static_cast<unsigned char>(word >> (8 * (6 - after)));
         read -= after;
         write -= after;
       } else if (after != 0) {
@@ -174,7 +177,8 @@ size_t ProtoBufByteOutputStream::FinishOneSection(size_t& readAt, size_t& writeA
         bytes[--write] = kMarker;  // a lone 0x64 at the very start: data
         continue;
       }
-      unsigned char code = bytes[--read];
+      if (code < 0) code = bytes[read - 1];
+      --read;
       if (code == 0x02) {
         if (depth == capacity) {
           size_t grown = capacity * 2;
