@@ -3,28 +3,11 @@
 #include <cstdint>
 
 #include "sarn/binary/ProtoBufByteOutputStream.h"
+#include "sarn/binary/internal/Varint.h"
 
 namespace sarn {
 
 namespace {
-
-// What WriteByte would append byte by byte, with one room check for the whole varint: ten bytes,
-// each possibly doubled as the marker.
-template <class U>
-void WriteVarint(U value, ProtoBufByteOutputStream* out) {
-  if (!out->Reserve(20)) return;
-  unsigned char* bytes = out->bytesM.pDataM;
-  size_t n = out->bytesM.nSizeM;
-  for (;;) {
-    unsigned char byte = value >= 0x80 ? static_cast<unsigned char>((value & 0x7F) | 0x80)
-                                       : static_cast<unsigned char>(value);
-    bytes[n++] = byte;
-    if (byte == 0x64) bytes[n++] = byte;
-    if (value < 0x80) break;
-    value >>= 7;
-  }
-  out->bytesM.nSizeM = n;
-}
 
 // One reader for both widths: the last byte may sit at shift kMaxShift at most (28 or 63), so a
 // varint longer than 5 or 10 bytes fails; the shift is checked before it is used, so a long run
@@ -50,18 +33,18 @@ bool ReadVarint(const unsigned char** cursor, const unsigned char* end, U* value
 
 }  // namespace
 
-void GoogleInt::WriteGoogleU32(unsigned int value, ProtoBufByteOutputStream* out) { WriteVarint(value, out); }
-
-void GoogleInt::WriteGoogleU64(unsigned long long value, ProtoBufByteOutputStream* out) { WriteVarint(value, out); }
-
-void GoogleInt::WriteGoogleS32(int value, ProtoBufByteOutputStream* out) {
-  uint32_t u = static_cast<uint32_t>(value);
-  WriteVarint((u << 1) ^ (0u - (u >> 31)), out);
+void GoogleInt::WriteGoogleU32(unsigned int value, ProtoBufByteOutputStream* out) {
+  internal::AppendVarint(value, out);
 }
 
+void GoogleInt::WriteGoogleU64(unsigned long long value, ProtoBufByteOutputStream* out) {
+  internal::AppendVarint(value, out);
+}
+
+void GoogleInt::WriteGoogleS32(int value, ProtoBufByteOutputStream* out) { internal::AppendZigZag32(value, out); }
+
 void GoogleInt::WriteGoogleS64(long long value, ProtoBufByteOutputStream* out) {
-  uint64_t u = static_cast<uint64_t>(value);
-  WriteVarint<unsigned long long>((u << 1) ^ (0ull - (u >> 63)), out);
+  internal::AppendZigZag64(value, out);
 }
 
 bool GoogleInt::ReadGoogleU32(const unsigned char** cursor, const unsigned char* end, unsigned int* value) {

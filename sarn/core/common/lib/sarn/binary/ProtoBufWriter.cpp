@@ -5,8 +5,10 @@
 #include <cstdint>
 #include <cstring>
 
-#include "sarn/binary/GoogleInt.h"
 #include "sarn/binary/ProtoBuf.h"
+#include "sarn/binary/internal/Varint.h"
+#include "sarn/dict/DictValue.h"
+#include "sarn/dict/Dictionary.h"
 #include "sarn/model/FieldAccess.h"
 #include "sarn/model/internal/ObjectWalk.h"
 #include "sarn/values/ScalarTypes.h"
@@ -33,7 +35,7 @@ ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, 
 // The tag and sections of a known dict: the type id (0 for no object) as a known-dict tag, then
 // the fields in a section.
 void OpenKnownDictValue(const SarnObject* object, Out* out) {
-  GoogleInt::WriteGoogleU32((object != nullptr ? object->GetTypeId() : 0) * 8 + 2, out);
+  internal::AppendVarint((object != nullptr ? object->GetTypeId() : 0u) * 8 + 2, out);
   out->StartSection();
 }
 
@@ -82,28 +84,28 @@ class ProtoBuf::Writer {
       return true;
     }
     int64_t tag = frame.dataM.fieldTagM;
-    if (tag != kNoTag) GoogleInt::WriteGoogleU32(static_cast<unsigned int>(tag), outM);
+    if (tag != kNoTag) internal::AppendVarint(static_cast<unsigned int>(tag), outM);
     switch (field.dataType) {
       case SARN_DATA_TYPE_BOOL:
-        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0 ? 1 : 0, outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0 ? 1u : 0u, outM);
         return true;
       case SARN_DATA_TYPE_DATE:
       case SARN_DATA_TYPE_S32:
-        GoogleInt::WriteGoogleS32(FieldAccess::ScalarValue<int32_t>(object, field, i), outM);
+        internal::AppendZigZag32(FieldAccess::ScalarValue<int32_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_DATETIME:
       case SARN_DATA_TYPE_S64:
-        GoogleInt::WriteGoogleS64(FieldAccess::ScalarValue<int64_t>(object, field, i), outM);
+        internal::AppendZigZag64(FieldAccess::ScalarValue<int64_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_ENUM:
       case SARN_DATA_TYPE_TIME:
       case SARN_DATA_TYPE_INT_ID:
       case SARN_DATA_TYPE_U32:
-        GoogleInt::WriteGoogleU32(FieldAccess::ScalarValue<uint32_t>(object, field, i), outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint32_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_LONG_ID:
       case SARN_DATA_TYPE_U64:
-        GoogleInt::WriteGoogleU64(FieldAccess::ScalarValue<uint64_t>(object, field, i), outM);
+        internal::AppendVarint(FieldAccess::ScalarValue<uint64_t>(object, field, i), outM);
         return true;
       case SARN_DATA_TYPE_FLOAT: {
         uint64_t bits = FieldAccess::ScalarValue<uint64_t>(object, field, i);
@@ -236,18 +238,76 @@ void ProtoBuf::MarshalKnownDictAsLazyField(const LazyDict* payload, Out* out) co
   MarshalKnownDictField(object.Get(), out);
 }
 
+// Any-dicts are written straight from their trees: one lookup per name instead of one per
+// question asked of the facade (count, kind, text), and no facade made per nested dictionary.
 // Dictionaries recurse once per nesting level, as their JSON writer does; the readers bound how
 // deep a tree can be.
-void ProtoBuf::MarshalAnyDict(Dict* dict, Out* out) const {
-  if (dict == nullptr) return;
-  VekStringArray names(pMempoolM);
-  dict->GetSortedNames(names);
+namespace {
+
+void WriteDictionaryEntries(const Dictionary* dictionary, VekMempool* pool, Out* out);
+
+// One value section's content: a string part, a nested dictionary's entries directly, or nothing
+// for any other kind.
+void WriteDictValue(const DictValue* value, VekMempool* pool, Out* out) {
+  if (value == nullptr) return;
+  switch (value->kindM) {
+    case DictValue::KIND_STRING:
+      out->AppendByte(18);
+      out->WriteString(static_cast<const StringValue*>(value)->valueM);
+      return;
+    case DictValue::KIND_DICTIONARY:
+      WriteDictionaryEntries(static_cast<const Dictionary*>(value), pool, out);
+      return;
+    case DictValue::KIND_LAZY_DICT: {
+      const ref<LazyDict>& payload = static_cast<const LazyDictValue*>(value)->lazyDictM;
+      if (!payload) return;
+      ref<Dict> nested = payload->ToDict();
+      if (nested) WriteDictionaryEntries(nested->GetDictionary().Get(), pool, out);
+      return;
+    }
+    default:
+      return;
+  }
+}
+
+void WriteValueSection(const DictValue* value, VekMempool* pool, Out* out) {
+  out->AppendByte(66);
+  out->StartSection();
+  WriteDictValue(value, pool, out);
+  out->EndSection();
+}
+
+// One entry's content: the name, then a value section per value stored under it, in order.
+void WriteEntryContent(const Dictionary* dictionary, const VekString& name, VekMempool* pool, Out* out) {
+  out->AppendByte(50);
+  out->WriteString(name);
+  ref<DictValue> first = dictionary->Get(name);
+  if (!first) return;
+  if (first->kindM != DictValue::KIND_ARRAY) {
+    WriteValueSection(first.Get(), pool, out);
+    return;
+  }
+  const ArrayValue* values = static_cast<const ArrayValue*>(first.Get());
+  unsigned count = values->CountValues();
+  for (unsigned i = 0; i < count; ++i) WriteValueSection(values->GetValueAt(i).Get(), pool, out);
+}
+
+void WriteDictionaryEntries(const Dictionary* dictionary, VekMempool* pool, Out* out) {
+  if (dictionary == nullptr) return;
+  VekStringArray names(pool);
+  dictionary->GetSortedNames(names);
   for (int n = 0; n < names.Count(); ++n) {
     out->AppendByte(34);
     out->StartSection();
-    MarshalAnyDictField(dict, names[n], out);
+    WriteEntryContent(dictionary, names[n], pool, out);
     out->EndSection();
   }
+}
+
+}  // namespace
+
+void ProtoBuf::MarshalAnyDict(Dict* dict, Out* out) const {
+  if (dict != nullptr) WriteDictionaryEntries(dict->GetDictionary().Get(), pMempoolM, out);
 }
 
 void ProtoBuf::MarshalAnyDictWithLength(Dict* dict, Out* out) const {
@@ -257,31 +317,11 @@ void ProtoBuf::MarshalAnyDictWithLength(Dict* dict, Out* out) const {
 }
 
 void ProtoBuf::MarshalAnyDictField(Dict* dict, const VekString& name, Out* out) const {
-  out->AppendByte(50);
-  out->WriteString(name);
-  unsigned count = dict->CountValues(name);
-  for (unsigned i = 0; i < count; ++i) {
-    out->AppendByte(66);
-    out->StartSection();
-    MarshalAnyDictValue(dict, name, i, out);
-    out->EndSection();
-  }
+  WriteEntryContent(dict->GetDictionary().Get(), name, pMempoolM, out);
 }
 
 void ProtoBuf::MarshalAnyDictValue(Dict* dict, const VekString& name, unsigned long index, Out* out) const {
-  switch (dict->GetType(name, static_cast<int>(index))) {
-    case dictvalue::TYPE_STRING:
-      out->AppendByte(18);
-      out->WriteString(dict->GetString(name, static_cast<int>(index)));
-      return;
-    case dictvalue::TYPE_DICT: {
-      ref<Dict> nested = dict->GetDict(name, static_cast<int>(index));
-      MarshalAnyDict(nested.Get(), out);
-      return;
-    }
-    default:
-      return;  // any other value is an empty value section
-  }
+  WriteDictValue(dict->FindValue(name, index).Get(), pMempoolM, out);
 }
 
 }  // namespace sarn
