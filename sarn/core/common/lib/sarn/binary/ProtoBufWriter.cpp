@@ -200,7 +200,7 @@ void ProtoBuf::MarshalSingleField(const FieldInfo* field, const SarnObject* obje
   // The caller has written the tag, so a null reference still needs a value: an empty one.
   if (FieldAccess::StorageOf(field->dataType) == FieldAccess::STORAGE_REFERENCE &&
       FieldAccess::ReferenceAt(object, *field, 0) == nullptr) {
-    if (TraitsOf(field->dataType).fHoldsObjects && field->dataType != SARN_DATA_TYPE_SUBDICT) {
+    if (TraitsOf(field->dataType).isHoldingObjects && field->dataType != SARN_DATA_TYPE_SUBDICT) {
       MarshalKnownDictField(nullptr, out);
     } else {
       out->StartSection();

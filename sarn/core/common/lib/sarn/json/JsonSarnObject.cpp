@@ -52,9 +52,9 @@ int FindTypeAnchor(const StructInfo* info, KernoVersion version) {
 // array, an element) has been written.
 struct JsonFrameData {
   int anchorM;
-  bool fTypeDoneM;
-  bool fFirstM;
-  bool fFirstElementM;
+  bool isTypeDoneM;
+  bool isFirstM;
+  bool isFirstElementM;
 };
 
 }  // namespace
@@ -75,30 +75,30 @@ class JsonSarnObject::Writer {
 
   void BeginObject(Frame& frame, Frame*) {
     outM.AppendByte('{');
-    frame.dataM.fFirstM = true;
+    frame.dataM.isFirstM = true;
     // An object without metadata says nothing, not even its type: an empty JSON object.
-    frame.dataM.fTypeDoneM = frame.pInfoM == nullptr;
+    frame.dataM.isTypeDoneM = frame.pInfoM == nullptr;
     frame.dataM.anchorM = frame.pInfoM != nullptr ? FindTypeAnchor(frame.pInfoM, frame.versionM) : -1;
   }
 
   void BeginField(Frame& frame) {
     // "type" stands just before its anchor, whether or not the anchor itself is written.
     JsonFrameData& data = frame.dataM;
-    if (!data.fTypeDoneM && data.anchorM >= 0 && frame.nFieldM >= static_cast<unsigned>(data.anchorM)) {
+    if (!data.isTypeDoneM && data.anchorM >= 0 && frame.nFieldM >= static_cast<unsigned>(data.anchorM)) {
       WriteTypeMember(frame);
     }
-    WriteMemberName(frame.pNameM, outM, data.fFirstM);
+    WriteMemberName(frame.pNameM, outM, data.isFirstM);
     if (frame.pFieldM->arity == SARN_ARITY_MULTI) {
       outM.AppendByte('[');
-      data.fFirstElementM = true;
+      data.isFirstElementM = true;
     }
   }
 
   bool Value(Frame& frame, unsigned i, Child& child) {
     const FieldInfo& field = *frame.pFieldM;
     if (field.arity == SARN_ARITY_MULTI) {
-      if (!frame.dataM.fFirstElementM) outM.AppendByte(',');
-      frame.dataM.fFirstElementM = false;
+      if (!frame.dataM.isFirstElementM) outM.AppendByte(',');
+      frame.dataM.isFirstElementM = false;
     }
     switch (field.dataType) {
       case SARN_DATA_TYPE_KNOWN_DICT:
@@ -131,14 +131,14 @@ class JsonSarnObject::Writer {
   }
 
   void EndObject(Frame& frame) {
-    if (!frame.dataM.fTypeDoneM) WriteTypeMember(frame);
+    if (!frame.dataM.isTypeDoneM) WriteTypeMember(frame);
     outM.AppendByte('}');
   }
 
  private:
   void WriteTypeMember(Frame& frame) {
-    frame.dataM.fTypeDoneM = true;
-    WriteMemberName("type", outM, frame.dataM.fFirstM);
+    frame.dataM.isTypeDoneM = true;
+    WriteMemberName("type", outM, frame.dataM.isFirstM);
     outM.AppendByte('"');
     AppendLiteral(outM, frame.pInfoM->pName);
     outM.AppendByte('"');
@@ -149,7 +149,7 @@ class JsonSarnObject::Writer {
     internal::FieldText text;
     internal::FormatFieldText(jsonM.pMempoolM, jsonM.pStructDefsM, jsonM.nStructDefsM, field, object, i, text);
     if (text.isFailedM) return false;
-    if (!TraitsOf(field.dataType).fQuotedInJson) {
+    if (!TraitsOf(field.dataType).isQuotedInJson) {
       AppendText(outM, text.pBytesM, text.nLengthM);
     } else if (text.pStringM != nullptr) {
       Json::StringToJson(*text.pStringM, false, outM);
@@ -204,7 +204,7 @@ void JsonSarnObject::SingleFieldToJson(const char* name, const FieldInfo* field,
   Writer writer(*this, out);
   JsonFrameData data = {-1, true, fFirst, true};
   writer.GetWalk().RunField(writer, object, *field, name, version, data);
-  fFirst = data.fFirstM;
+  fFirst = data.isFirstM;
 }
 
 void JsonSarnObject::MultiFieldToJson(const char* name, const FieldInfo* field, const SarnObject* object,

@@ -41,17 +41,17 @@ struct DataTypeTraits {
     STORAGE_REFERENCE = 2,
     STORAGE_NONE = 3,  // data type codes outside 0..20
   };
-  uint8_t dataType;     // the row's own code, checked against its index below
+  uint8_t dataType;       // the row's own code, checked against its index below
   Storage storage;
-  uint8_t width;        // bytes of one scalar value (1, 4 or 8); 0 for the other forms
-  bool fHoldsObjects;   // a value is (or, for a lazy payload, may hold) a schema object
-  bool fHasText;        // a value has a text form of its own (all but dictionaries and objects)
-  bool fQuotedInJson;   // that text is a JSON string (BOOL, S32 and U32 travel bare)
-  uint8_t wireType;     // protocol-buffer wire type: 0 varint, 1 eight bytes, 2 length-delimited
+  uint8_t width;          // bytes of one scalar value (1, 4 or 8); 0 for the other forms
+  bool isHoldingObjects;  // a value is (or, for a lazy payload, may hold) a schema object
+  bool isWithText;        // a value has a text form of its own (all but dictionaries and objects)
+  bool isQuotedInJson;    // that text is a JSON string (BOOL, S32 and U32 travel bare)
+  uint8_t wireType;       // protocol-buffer wire type: 0 varint, 1 eight bytes, 2 length-delimited
 
   // A null reference of this type is no value at all and is left out by every writer. A null
   // byte string is not: it has a text form (the empty one).
-  constexpr bool IsNullAbsent() const { return storage == STORAGE_REFERENCE && !fHasText; }
+  constexpr bool IsNullAbsent() const { return storage == STORAGE_REFERENCE && !isWithText; }
 };
 
 namespace internal {
@@ -95,8 +95,8 @@ constexpr bool TraitsAreConsistent() {
     if (t.dataType != code) return false;                          // one row per code, in order
     if ((t.storage == kScalar) != (t.width != 0)) return false;    // only scalars have a width
     if (t.width != 0 && t.width != 1 && t.width != 4 && t.width != 8) return false;
-    if (t.fHoldsObjects && (t.storage != kReference || t.fHasText)) return false;
-    if (!t.fHasText && t.fQuotedInJson) return false;
+    if (t.isHoldingObjects && (t.storage != kReference || t.isWithText)) return false;
+    if (!t.isWithText && t.isQuotedInJson) return false;
     if (t.wireType > 2 || (t.storage != kScalar && t.wireType != 2)) return false;
     if (t.wireType == 1 && t.width != 8) return false;
   }
@@ -117,8 +117,8 @@ static_assert(TraitsOf(SARN_DATA_TYPE_BOOL).width == 1 && TraitsOf(SARN_DATA_TYP
                   TraitsOf(SARN_DATA_TYPE_LONG_ID).width == sizeof(uint64_t) &&
                   TraitsOf(SARN_DATA_TYPE_FLOAT).width == sizeof(double),
               "scalar widths are the widths of the stored C++ types");
-static_assert(!TraitsOf(SARN_DATA_TYPE_S32).fQuotedInJson && TraitsOf(SARN_DATA_TYPE_S64).fQuotedInJson &&
-                  TraitsOf(SARN_DATA_TYPE_STRING).fQuotedInJson,
+static_assert(!TraitsOf(SARN_DATA_TYPE_S32).isQuotedInJson && TraitsOf(SARN_DATA_TYPE_S64).isQuotedInJson &&
+                  TraitsOf(SARN_DATA_TYPE_STRING).isQuotedInJson,
               "JSON writes 32-bit integers bare and 64-bit ones as strings");
 static_assert(TraitsOf(SARN_DATA_TYPE_PLACEHOLDER).storage == DataTypeTraits::STORAGE_NONE, "placeholder has no value");
 

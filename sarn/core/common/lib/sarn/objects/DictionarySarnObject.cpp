@@ -110,7 +110,7 @@ class DictionarySarnObject::Builder {
     if (wasOutOfMemoryM) return false;
     const FieldInfo& field = *frame.pFieldM;
     // A lazy payload is kept as it is (shared, not converted); other objects become dictionaries.
-    if (TraitsOf(field.dataType).fHoldsObjects && field.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
+    if (TraitsOf(field.dataType).isHoldingObjects && field.dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
       child.pObjectM = static_cast<const SarnObject*>(FieldAccess::ReferenceAt(frame.pObjectM, field, i));
       child.versionM = frame.versionM;
       return true;
@@ -176,7 +176,7 @@ void DictionarySarnObject::MultiFieldToDict(const VekString& name, const FieldIn
 ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const SarnObject* object, unsigned i) {
   VekMempool* pool = pMempoolM;
   const DataTypeTraits& traits = TraitsOf(field.dataType);
-  if (traits.fHasText) {
+  if (traits.isWithText) {
     internal::FieldText text;
     internal::FormatFieldText(pool, structDefsM, static_cast<uint32_t>(structDefCountM), field, object, i, text);
     if (text.isFailedM) return nullptr;
@@ -191,7 +191,7 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
       value = new (pool) StringValue(copy);
     }
     if (value == nullptr) return nullptr;
-    value->needQuotesM = traits.fQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
+    value->needQuotesM = traits.isQuotedInJson && field.dataType != SARN_DATA_TYPE_FLOAT;
     return value;
   }
   VekCore* reference = FieldAccess::ReferenceAt(object, field, i);
@@ -319,13 +319,13 @@ bool DictionarySarnObject::DictToMultiField(const FieldInfo* field, const ref<Di
 // appends cannot overflow here: a source ArrayValue holds at most as many elements as a field's
 // array can.
 bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue>& value, SarnObject* object,
-                                     VekString& error, KernoVersion version, bool fMulti) {
+                                     VekString& error, KernoVersion version, bool isMulti) {
   VekMempool* pool = pMempoolM;
   const unsigned dataType = field.dataType;
-  const bool fString = value->kindM == DictValue::KIND_STRING;
-  const StringValue* string = fString ? static_cast<const StringValue*>(value.Get()) : nullptr;
+  const bool isString = value->kindM == DictValue::KIND_STRING;
+  const StringValue* string = isString ? static_cast<const StringValue*>(value.Get()) : nullptr;
   const char* badText =
-      fMulti ? "Dictionary string cannot be converted to requested data type in SarnObject array" : "Cannot convert field";
+      isMulti ? "Dictionary string cannot be converted to requested data type in SarnObject array" : "Cannot convert field";
 
   switch (dataType) {
     case SARN_DATA_TYPE_BOOL:
@@ -340,13 +340,13 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
     case SARN_DATA_TYPE_S32:
     case SARN_DATA_TYPE_U32:
     case SARN_DATA_TYPE_U64:
-      if (!fString) {
+      if (!isString) {
         Replace(pool, error, "Dictionary field is not a single string");
         return false;
       }
       break;
     case SARN_DATA_TYPE_STRING:
-      if (!fString) {
+      if (!isString) {
         Append(pool, error, "Dictionary field is not a single string");
         return false;
       }
@@ -355,7 +355,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
     case SARN_DATA_TYPE_INT_ID:
     case SARN_DATA_TYPE_LONG_ID:
     case SARN_DATA_TYPE_STRING_ID:
-      if (!fString) {
+      if (!isString) {
         Append(pool, error, "Field must be a single string");
         return false;
       }
@@ -363,7 +363,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
     default:
       break;
   }
-  const char* badItem = fMulti ? "Bad value in field: " : "Cannot convert value for the field.";
+  const char* badItem = isMulti ? "Bad value in field: " : "Cannot convert value for the field.";
 
   switch (dataType) {
     case SARN_DATA_TYPE_BOOL: {
@@ -473,7 +473,7 @@ bool DictionarySarnObject::ReadValue(const FieldInfo& field, const ref<DictValue
       }
       ref<SarnObject> inner;
       if (!DictionaryToSarnObject(ref<Dictionary>(static_cast<Dictionary*>(value.Get())), version, inner, error)) {
-        Append(pool, error, fMulti ? " Can't convert inner Dictionary to SarnObject" : ". Can't unmarshal inner Dictionary");
+        Append(pool, error, isMulti ? " Can't convert inner Dictionary to SarnObject" : ". Can't unmarshal inner Dictionary");
         return false;
       }
       return Stored(FieldAccess::PutReference(object, field, inner.Get()), pool, error);

@@ -81,7 +81,7 @@ class SARN_EXPORT DictionarySarnObject {
   ref<DictValue> MakeValue(const FieldInfo& field, const SarnObject* object, unsigned i);
 
   bool ReadValue(const FieldInfo& field, const ref<DictValue>& value, SarnObject* object, VekString& error,
-                 KernoVersion version, bool fMulti);
+                 KernoVersion version, bool isMulti);
   bool StringToEnum(const FieldInfo& field, const VekString& text, VekString& error, uint32_t& value);
   static bool SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const VekString& text, VekString& error,
                            size_t& prefixLength);

@@ -16,9 +16,9 @@ inline void AppendText(ByteBuffer& out, const char* text, size_t length) {
   out.AppendBytes(reinterpret_cast<const unsigned char*>(text), length);
 }
 
-// "%llu" or "%lld" of the value, in double quotes when `fQuoted`.
+// "%llu" or "%lld" of the value, in double quotes when `isQuoted`.
 template <class Integer>
-inline void AppendInteger(ByteBuffer& out, Integer value, bool fQuoted) {
+inline void AppendInteger(ByteBuffer& out, Integer value, bool isQuoted) {
   char text[24];
   text[0] = '"';
   size_t n = 1;
@@ -27,8 +27,8 @@ inline void AppendInteger(ByteBuffer& out, Integer value, bool fQuoted) {
   } else {
     n += FormatU64Into(text + 1, static_cast<unsigned long long>(value));
   }
-  if (fQuoted) text[n++] = '"';
-  AppendText(out, fQuoted ? text : text + 1, fQuoted ? n : n - 1);
+  if (isQuoted) text[n++] = '"';
+  AppendText(out, isQuoted ? text : text + 1, isQuoted ? n : n - 1);
 }
 
 // True when the JSON string form of these bytes is the bytes themselves in quotes: no control
