@@ -130,8 +130,8 @@ ref<Dictionary> LazyDict::DictionaryOf(VekString& error) const {
       if (dictionaryM) return dictionaryM;
       break;
     default:
-      // REP_PROTOBUF, REP_OBJECT and REP_BYTESOURCE convert through the object layer, which is
-      // not here yet: they are answered as an unknown representation.
+      // REP_PROTOBUF, REP_OBJECT and REP_BYTESOURCE have no conversion to a tree here: they are
+      // answered as an unknown representation.
       break;
   }
   error = VekString::Format(pMempoolM, "%s", kUnknownRepForDictionaryG);
@@ -150,7 +150,8 @@ ref<Dict> LazyDict::ToDict() const {
     return MempoolNew<Dict>(pMempoolM, dictionary);
   }
   if (repM == REP_DICTIONARY && dictionaryM) return MempoolNew<Dict>(pMempoolM, dictionaryM);
-  // Unknown representation, or a form converted by the object layer (not here yet).
+  // Unknown representation, or a form without a conversion to a tree here (protocol-buffer bytes,
+  // an object, a byte source): the error dictionary.
   ref<Dict> error = Dict::New(pMempoolM, VekString("error"));
   if (!error || !error->AddString("code", "internalError") || !error->AddString("text", "bad rep in LazyDict")) {
     return ref<Dict>();
@@ -209,8 +210,8 @@ namespace sarn {
 
 ref<SarnObject> LazyDict::ToSarnObjectOrErrorString(VekString& error) const {
   if (repM == REP_OBJECT) return objectM;
-  // Only the object form is held as an object here; every other form is answered as an unknown
-  // form until its conversion to an object is written.
+  // Only the object form converts to an object; every other form is answered as an unknown
+  // representation.
   error = VekString::Format(pMempoolM, "%s", "unknown rep in LazyDict");
   return nullptr;
 }
