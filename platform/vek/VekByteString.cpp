@@ -9,7 +9,11 @@ VekByteString::VekByteString() : pDataM(nullptr), lengthM(0) {}
 
 VekByteString::~VekByteString() { GetMempool()->Free(pDataM); }
 
-bool VekByteString::SetLength(unsigned long length) {
+bool VekByteString::SetLength(unsigned long length) { return Resize(length, true); }
+
+bool VekByteString::SetLengthUnfilled(unsigned long length) { return Resize(length, false); }
+
+bool VekByteString::Resize(unsigned long length, bool isZeroFilled) {
   if (length == lengthM) return true;
   if (length == 0) {
     GetMempool()->Free(pDataM);
@@ -20,7 +24,7 @@ bool VekByteString::SetLength(unsigned long length) {
   void* data = GetMempool()->Realloc(pDataM, length);
   if (data == nullptr) return false;
   pDataM = static_cast<unsigned char*>(data);
-  if (length > lengthM) std::memset(pDataM + lengthM, 0, length - lengthM);
+  if (isZeroFilled && length > lengthM) std::memset(pDataM + lengthM, 0, length - lengthM);
   lengthM = length;
   return true;
 }

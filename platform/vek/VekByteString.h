@@ -1,7 +1,8 @@
 // Counted byte strings.
 //
 // VekByteString     a growable byte string whose length the owner sets (SetLength keeps the
-//                   bytes in front and zeroes new ones); storage comes from the object's pool.
+//                   bytes in front and zeroes new ones; SetLengthUnfilled leaves new ones
+//                   unwritten); storage comes from the object's pool.
 // vek::ByteBuffer   the counted byte string that holds byte-string values and finished binary
 //                   results. Derivable: the storage (vek::SizedObjectArray<1, VekMempool>:
 //                   pool, data, capacity, length) is a protected member that a derived class
@@ -21,6 +22,9 @@ class VekByteString : public VekCore {
   ~VekByteString() override;
   // New bytes are zero. False (nothing changed) when memory runs out.
   bool SetLength(unsigned long length);
+  // As SetLength, but new bytes are left unwritten: for an owner that tracks which bytes it has
+  // written and reads no others (a growable buffer's spare room, which it fills by appending).
+  bool SetLengthUnfilled(unsigned long length);
   // Offsets must lie inside the current length (asserted).
   void SetByte(unsigned long offset, unsigned char byte);
   void SetBytes(unsigned long offset, unsigned long count, const unsigned char* bytes);
@@ -28,6 +32,8 @@ class VekByteString : public VekCore {
   unsigned long GetLength() const { return lengthM; }
 
  private:
+  bool Resize(unsigned long length, bool isZeroFilled);
+
   unsigned char* pDataM;
   unsigned long lengthM;
 };

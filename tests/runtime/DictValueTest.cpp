@@ -271,3 +271,51 @@ TEST_F(DictValueTest, ReleasesHandBuiltTreesOfAnyDepthInFlatStack) {
 }
 
 }  // namespace
+
+// Texts taken out of a tree either reader built (through the facade, a copied VekString) stay
+// valid after the tree is gone, unchanged and still of the tree's pool; once they go too, the
+// pool is back to zero used bytes.
+TEST_F(DictValueTest, TextsTakenOutOutliveTheTreeEachReaderBuilt) {
+  const std::string json = R"({"s": "caf)" "\xC3\xA9" R"( \"q\"\t", "n": -12.5e3, "b": true, "e": "", "z": null, )"
+                           R"("a": ["x", 7, {"k": "a text long enough to need a large block )" +
+                           std::string(600, 'y') + R"("}]})";
+  const std::string compact = R"({"a": ["x", 7, {"k": "a text long enough to need a large block )" +
+                              std::string(600, 'y') + R"("}], "b": true, "e": "", "n": "-12.5e3", )"
+                              R"("s": "caf)" "\xC3\xA9" R"( \"q\"\t", "z": null})";
+  for (int reader = 0; reader < 2; ++reader) {
+    SCOPED_TRACE(reader == 0 ? "hand-written reader" : "streaming reader in 7-byte chunks");
+    VekString s, n, b, k;
+    {
+      ref<Dictionary> tree;
+      if (reader == 0) {
+        tree = Read(&poolM, json);
+      } else {
+        std::vector<std::string_view> chunks;
+        for (size_t i = 0; i < json.size(); i += 7) chunks.push_back(std::string_view(json).substr(i, 7));
+        bool isOk;
+        tree = Parse(&poolM, chunks, &isOk);
+        ASSERT_TRUE(isOk);
+      }
+      ASSERT_TRUE(tree);
+      EXPECT_EQ(Compact(tree), compact);
+      ref<Dict> facade = new (&poolM) Dict(tree);
+      s = facade->GetString("s", 0);
+      n = tree->GetString(VekString("n"));
+      b = static_cast<StringValue*>(tree->Get(VekString("b")).Get())->valueM;
+      ref<DictValue> third = tree->GetArray(VekString("a"))->GetValueAt(2);
+      ASSERT_EQ(third->kindM, DictValue::KIND_DICTIONARY);
+      k = static_cast<Dictionary*>(third.Get())->GetString(VekString("k"));
+    }
+    EXPECT_GT(poolM.GetUsedBytes(), 0u) << "the taken texts hold their blocks";
+    EXPECT_EQ(Str(s), "caf\xC3\xA9 \"q\"\t");
+    EXPECT_EQ(Str(n), "-12.5e3");
+    EXPECT_EQ(Str(b), "true");
+    EXPECT_EQ(Str(k), "a text long enough to need a large block " + std::string(600, 'y'));
+    for (const VekString* text : {&s, &n, &b, &k}) EXPECT_EQ(text->GetMempool(), &poolM);
+    VekString sCopy = s;
+    s = n = b = k = VekString();
+    EXPECT_EQ(Str(sCopy), "caf\xC3\xA9 \"q\"\t");
+    sCopy = VekString();
+    EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+  }
+}

@@ -16,7 +16,9 @@ bool Vek1ByteBuffer::Grow(unsigned long n) {
   // The sum must not wrap: a wrapped capacity would be smaller than what is appended.
   if (n > ULONG_MAX - capacity - extra) return false;
   if (!bytesM) bytesM = new (pMempoolM) VekByteString();
-  if (bytesM && bytesM->SetLength(capacity + n + extra)) {
+  // The spare room is written by the appends before anything reads it (GetData covers only
+  // the nUsedM bytes appended), so growing need not zero it first.
+  if (bytesM && bytesM->SetLengthUnfilled(capacity + n + extra)) {
     pDataM = bytesM->GetData();
     capacityM = bytesM->GetLength();
     return true;
