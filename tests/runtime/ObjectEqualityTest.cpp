@@ -56,18 +56,6 @@ void Put(VekMempool* pool, SarnObject* object, const FieldInfo& field, const std
   }
 }
 
-// A nest of `depth` lists, each holding the next as its one item; the innermost holds `message`.
-ref<SarnObject> Nest(VekMempool* pool, int depth, const char* message) {
-  ref<SarnObject> inner = FromJson(pool, std::string("{\"type\":\"success\",\"message\":\"") + message + "\"}");
-  const FieldInfo* item = objopstest::FieldNamed(StructInfoForId(644), "item");
-  for (int level = 0; level < depth; ++level) {
-    ref<SarnObject> outer = StructInfoForId(644)->pFactory(pool);
-    FieldAccess::PutReference(outer.Get(), *item, inner.Get());
-    inner = outer;
-  }
-  return inner;
-}
-
 }  // namespace
 
 // Rows: type.field => values of one side => of the other ('|' between elements, '~' for none) => result.
@@ -124,7 +112,8 @@ TEST(ObjectEquality, AbsentStorageIsNotComparedAndPlainObjectsAllocateNothing) {
 TEST(ObjectEquality, DepthUsesNoCStack) {
   VekMempool pool("deep");
   const int depth = 10 * JsonLimits::kDefaultMaxDepth;
-  ref<SarnObject> a = Nest(&pool, depth, "bottom"), b = Nest(&pool, depth, "bottom"), c = Nest(&pool, depth, "other");
+  ref<SarnObject> a = objopstest::Nest(&pool, depth, "bottom"), b = objopstest::Nest(&pool, depth, "bottom"),
+                  c = objopstest::Nest(&pool, depth, "other");
   sarntest::RunOnStack(256 * 1024, [&] {
     EXPECT_TRUE(*a == *b);
     EXPECT_TRUE(*a != *c && *c != *a);

@@ -45,4 +45,16 @@ inline const FieldInfo* FieldNamed(const StructInfo* info, const char* name) {
   return nullptr;
 }
 
+// A nest of `depth` lists (unifiedItemList), each holding the next as its one item; the innermost
+// holds a success with `message`.
+inline ref<SarnObject> Nest(VekMempool* pool, int depth, const std::string& message) {
+  ref<SarnObject> inner = FromJson(pool, "{\"type\":\"success\",\"message\":\"" + message + "\"}");
+  for (int level = 0; level < depth; ++level) {
+    ref<SarnObject> outer = StructInfoForId(644)->pFactory(pool);
+    FieldAccess::PutReference(outer.Get(), *FieldNamed(outer->GetStructInfo(), "item"), inner.Get());
+    inner = outer;
+  }
+  return inner;
+}
+
 }  // namespace objopstest
