@@ -93,7 +93,7 @@ ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCount
   if (form == "dictionary") return LazyDict::FromDictionary(pool, tree, version);
   if (form == "source") return FromSource(pool, json, counts, version);
   if (name == "badJson") return LazyDict::FromJsonString(pool, VekString("{\"type\": oops"), 0);
-  if (name == "badPb") return LazyDict::FromJsonString(pool, VekString("\xfa\x0b\x05garbage"), 0);
+  if (name == "badPb") return LazyDict::FromJsonString(pool, VekString("\xfa\x0b\x09garbage"), 0);
   if (name == "noType") return LazyDict::FromDictionary(pool, Read(pool, R"({"city": "x"})"), 0);
   if (name == "unknownType") return LazyDict::FromDictionary(pool, Read(pool, R"({"type": "nosuch"})"), 0);
   if (name == "badSource") return FromSource(pool, "{\"type\": \"address\", x}", counts, 0);
@@ -234,6 +234,70 @@ TEST_F(LazyDictTest, PayloadsInsideTreesWriteAndCompareAsPayloads) {
   EXPECT_TRUE(empty->Equals(ref<LazyDictValue>(new (&poolM) LazyDictValue())));
   EXPECT_EQ(Compact(empty), "null");
   EXPECT_EQ(Str(LazyDictValue::EmptyValue(&poolM)->ToJson(false)), "{}");
+}
+
+}  // namespace
+
+namespace {
+
+using namespace dicttest;
+using LazyNestingTest = sarntest::PoolTest;
+
+void PrependVarint(std::string& reversed, size_t value) {
+  std::string bytes;
+  do {
+    bytes += static_cast<char>((value & 0x7f) | (value > 0x7f ? 0x80 : 0));
+    value >>= 7;
+  } while (value != 0);
+  reversed.append(bytes.rbegin(), bytes.rend());
+}
+
+// Protocol-buffer bytes of a kernoRpcRequest whose request holds another one, `depth` times, around
+// an address: each level's bytes are the known dict (tag, length) of its fields, the lazy last.
+std::string NestedRequests(VekMempool* pool, int depth) {
+  std::string innermost = BinaryOf(pool, Address(pool).Get());
+  std::string reversed(innermost.rbegin(), innermost.rend());
+  for (int level = 0; level < depth; ++level) {
+    size_t inner = reversed.size();
+    PrependVarint(reversed, inner);
+    reversed += std::string("\x12\x00\x20\x00\x18\x00\x08", 7);
+    PrependVarint(reversed, reversed.size());  // the fields' length: everything so far
+    reversed += "\x3c\xfa";
+  }
+  return std::string(reversed.rbegin(), reversed.rend());
+}
+
+size_t Count(const std::string& text, const std::string& what) {
+  size_t n = 0;
+  for (size_t at = text.find(what); at != std::string::npos; at = text.find(what, at + 1)) ++n;
+  return n;
+}
+
+TEST_F(LazyNestingTest, PayloadsNestedPastTheLimitConvertOnASmallStack) {
+  const std::string limit = "Lazy payload nesting exceeds the depth limit of 512 levels.";
+  sarntest::RunOnStack(256 * 1024, [&] {
+    std::string bytes = NestedRequests(&poolM, 100000);
+    ref<LazyDict> payload = LazyDict::FromJsonString(&poolM, Text(&poolM, bytes), 0);
+    unsigned int typeId = 0;
+    EXPECT_TRUE(payload->GetType(&typeId) && typeId == 975);
+    // Each writer converts the payloads inside one another until a limit falls; there the
+    // "error" object stands for the rest.
+    for (bool pretty : {false, true}) {
+      std::string text = Str(payload->ToJson(pretty));
+      size_t levels = Count(text, "kernoRpcRequest");
+      EXPECT_TRUE(levels > 8 && levels <= 512) << levels;
+      EXPECT_EQ(Count(text, limit), 1u);
+      EXPECT_EQ(text.find("address"), std::string::npos);
+    }
+    ref<SarnObject> object = payload->ToSarnObjectOrError();
+    ASSERT_EQ(Str(object->GetTypeName()), "kernoRpcRequest");
+    std::string binary = BinaryOf(&poolM, object.Get());
+    EXPECT_EQ(Count(binary, limit), 1u);
+    // The object and the 512 payloads around which the binary writer counts its levels.
+    EXPECT_EQ(Count(binary, std::string("\xfa\x3c", 2)), 513u);
+    EXPECT_EQ(payload->ToProtobuf(), payload->bytesM);
+    EXPECT_TRUE(*payload == *LazyDict::FromSarnObject(&poolM, object, 0));
+  });
 }
 
 }  // namespace

@@ -25,6 +25,7 @@ const char kLazyDictNoDuplicateMessage[] = "Byte source could not be duplicated.
 namespace internal {
 
 thread_local int LazyNesting::depthG = 0;
+thread_local const char* LazyNesting::pOutermostG = nullptr;
 
 LazyForm FormOf(const LazyDict& payload, const LazyNesting& nesting) {
   LazyForm form{payload.repM, ref<SarnObject>()};

@@ -4,6 +4,8 @@
 // Thread safety: the nesting count is per thread; everything else works on the caller's payload.
 #pragma once
 
+#include <cstddef>
+
 #include "sarn/base/Limits.h"
 #include "sarn/dict/LazyDict.h"
 
@@ -11,19 +13,37 @@ namespace sarn {
 namespace internal {
 
 // One conversion running on this thread; conversions that a writer, another conversion or a
-// comparison starts inside it count one level more.
+// comparison starts inside it count one level more. A walker that converts payloads one inside
+// another without recursing (the binary writer) passes the levels around the conversion itself.
+// Too deep: past Limits::kDefaultMaxDepth levels, or past kLazyNestingStackBytes of native stack
+// below the outermost conversion (sanitizers and unoptimised builds get eight times the room, as
+// their frames are that much larger).
 class LazyNesting {
  public:
-  LazyNesting() { ++depthG; }
-  ~LazyNesting() { --depthG; }
+  explicit LazyNesting(int levels = 1) : levelsM(levels) {
+    const char* here = static_cast<const char*>(__builtin_frame_address(0));
+    if (depthG == 0) pOutermostG = here;
+    depthG += levels;
+    isTooDeepM = depthG > Limits::kDefaultMaxDepth ||
+                 (depthG > 1 && static_cast<size_t>(pOutermostG - here) > kStackBytes);
+  }
+  ~LazyNesting() { depthG -= levelsM; }
   LazyNesting(const LazyNesting&) = delete;
   LazyNesting& operator=(const LazyNesting&) = delete;
-  bool IsTooDeep() const { return depthG > Limits::kDefaultMaxDepth; }
-  // Whether a conversion started now would be past the limit.
+  bool IsTooDeep() const { return isTooDeepM; }
+  // Whether a conversion started now would be past the level limit.
   static bool IsNextTooDeep() { return depthG + 1 > Limits::kDefaultMaxDepth; }
 
  private:
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__) || !defined(__OPTIMIZE__)
+  static constexpr size_t kStackBytes = 8 * kLazyNestingStackBytes;
+#else
+  static constexpr size_t kStackBytes = kLazyNestingStackBytes;
+#endif
+  int levelsM;
+  bool isTooDeepM;
   static thread_local int depthG;
+  static thread_local const char* pOutermostG;
 };
 
 // Not a value of the enum: a representation outside it, or a form whose member is missing.
