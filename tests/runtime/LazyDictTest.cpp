@@ -2,6 +2,7 @@
 // duplicates, feature 548 and the sink pieces, the log line, equality, and nesting past the limit.
 #include <map>
 #include <memory>
+#include <regex>
 
 #include "runtime/DictTestSupport.h"
 #include "testutil/ObjectFill.h"
@@ -193,6 +194,143 @@ TEST_F(LazyDictTest, EveryOperationOfEveryForm) {
     }
     EXPECT_EQ(counts.deletedM, counts.duplicatesM + (row[0].rfind("source", 0) == 0 || row[0].find("Source") != std::string::npos || row[0] == "noDuplicate"));
   }
+}
+
+// An address whose street takes `size` bytes, as JSON (version 0).
+std::string LongAddress(VekMempool* pool, size_t size) {
+  ref<SarnObject> address = Address(pool);
+  static_cast<sarnschema::Address*>(address.Get())->street1M = Text(pool, std::string(size, 's'));
+  return ObjectJson(pool, address);
+}
+
+TEST_F(LazyDictTest, ByteSourceIsReadThroughDuplicatesAndTypeQueriesReadItOnce) {
+  SourceCounts counts;
+  std::string body = LongAddress(&poolM, 20000);
+  {
+    ref<LazyDict> payload = FromSource(&poolM, body, &counts, 0);  // one byte per read
+    EXPECT_EQ(Str(payload->ToJson(false)), Compact(Read(&poolM, body)));
+    EXPECT_EQ(counts.duplicatesM, 1);
+    unsigned int typeId = 0;
+    VekString name;
+    EXPECT_TRUE(payload->GetType(&typeId) && typeId == 191);
+    EXPECT_TRUE(payload->GetTypeName(&name) && Str(name) == "address");
+    EXPECT_EQ(payload->repM, LazyDict::REP_DICTIONARY);
+    EXPECT_TRUE(payload->pBytesourceM == nullptr && payload->dictionaryM);
+    EXPECT_EQ(counts.duplicatesM, 2) << "later type queries read nothing";
+    EXPECT_EQ(counts.deletedM, 3) << "both duplicates and the source itself, once";
+  }
+  EXPECT_EQ(counts.deletedM, 3);
+  EXPECT_EQ(counts.ownReadsM, 0);
+
+  // A failed read keeps the form and the source, and the partial tree the reader returned.
+  SourceCounts failing;
+  std::string cut = "{\"type\": \"address\", \"street1\": \"" + std::string(17000, 's');
+  ref<LazyDict> payload = FromSource(&poolM, cut, &failing, 0);
+  VekString name;
+  EXPECT_TRUE(payload->GetTypeName(&name) && Str(name) == "address");
+  EXPECT_TRUE(payload->repM == LazyDict::REP_BYTESOURCE && payload->pBytesourceM && payload->dictionaryM);
+  unsigned int typeId = 0;
+  EXPECT_TRUE(payload->GetType(&typeId) && typeId == 191);
+  EXPECT_EQ(failing.duplicatesM, 1) << "a tree once kept is not read again";
+  EXPECT_EQ(Str(payload->ToJson(false)), cut) << "the bytes as they came";
+}
+
+// A sink that records the size of every Write and refuses the one numbered `failAtM` (from 1).
+struct PieceSink : wynbaselib::Bytesink {
+  bool Write(const char* data, size_t size) override {
+    piecesM.push_back(size);
+    textM.append(data, size);
+    return static_cast<int>(piecesM.size()) != failAtM;
+  }
+  bool Flush() override { return true; }
+  std::vector<size_t> piecesM;
+  std::string textM;
+  int failAtM = 0;
+};
+
+TEST_F(LazyDictTest, Feature548WritesACompactObjectToASinkInPieces) {
+  std::string body = LongAddress(&poolM, 40000);
+  ref<LazyDict> payload = LazyDict::FromSarnObject(&poolM, LazyDict::FromJsonString(&poolM, Text(&poolM, body), 0)->ToSarnObjectOrError(), 0);
+  std::string tree = Str(payload->ToDict()->ToString(false));
+  std::string pretty = Str(payload->ToJson(true));
+  for (bool isDirect : {false, true}) {
+    VekFeatures::SetEnabled(548, isDirect);
+    for (int failAt : {0, 1, 2}) {
+      PieceSink sink;
+      sink.failAtM = failAt;
+      payload->ToJsonBytesink(sink, false);
+      if (isDirect) {
+        std::vector<size_t> pieces = {16384, 16384, body.size() - 32768};
+        pieces.resize(failAt == 0 ? 3 : failAt);
+        EXPECT_EQ(sink.piecesM, pieces) << "the first Write that fails ends it";
+        EXPECT_EQ(sink.textM, body.substr(0, sink.textM.size()));
+      } else if (failAt == 0) {
+        EXPECT_EQ(sink.textM, tree) << "through a Dictionary";
+      }
+    }
+    sarntest::StringSink sink;
+    payload->ToJsonBytesink(sink, true);
+    EXPECT_EQ(sink.textM, pretty);
+    EXPECT_EQ(Str(payload->ToJson(false)), body) << "the buffer writer is direct either way";
+  }
+  VekFeatures::SetEnabled(548, false);
+}
+
+std::vector<std::string>* gLinesG = nullptr;
+void CaptureLine(int facility, int priority, const char* tag, const char* line) {
+  gLinesG->push_back(std::to_string(facility) + " " + std::to_string(priority) + " " + tag + " " + line);
+}
+
+TEST(LazyDictLogTest, OneLineForEachMeasuredConversionOfTheLoggedType) {
+  VekMempool pool("lazy log pool");
+  std::vector<std::string> lines;
+  gLinesG = &lines;
+  VekLogger::Sink previous = VekLogger::SetSink(CaptureLine);
+  {
+    ref<SarnObject> logged = sarnschema::ChannelMapConfigInstructions::Factory(&pool);
+    static_cast<sarnschema::ChannelMapConfigInstructions*>(logged.Get())->hostNameM = "host";
+    static_cast<sarnschema::ChannelMapConfigInstructions*>(logged.Get())->fHasHostNameM = true;
+    std::string json = ObjectJson(&pool, logged);
+    SourceCounts counts;
+    for (bool isDirect : {false, true}) {
+      VekFeatures::SetEnabled(548, isDirect);
+      for (const std::string& body : {json, ObjectJson(&pool, Address(&pool))}) {
+        LazyDict::FromJsonString(&pool, Text(&pool, body), 0)->ToSarnObjectOrError();
+        FromSource(&pool, body, &counts, 0, 4096)->ToSarnObjectOrError();
+      }
+      // Neither other forms nor other operations log.
+      LazyDict::FromSarnObject(&pool, logged, 0)->ToSarnObjectOrError();
+      LazyDict::FromJsonString(&pool, Text(&pool, BinaryOf(&pool, logged.Get())), 0)->ToSarnObjectOrError();
+      LazyDict::FromJsonString(&pool, Text(&pool, json), 0)->ToProtobuf();
+    }
+    VekFeatures::SetEnabled(548, false);
+    ASSERT_EQ(lines.size(), 4u);
+    const std::string labels[] = {"old REP_JSON> 0", "old REP_BYTESOURCE> 0", "new REP_JSON> ", "new REP_BYTESOURCE> "};
+    for (size_t i = 0; i < 4; ++i) {
+      std::string expected = "0 6 LazyDict ToSarnObject " + labels[i].substr(0, labels[i].find('>')) +
+                             " <channelMapConfigInstructions> " +
+                             (i < 2 ? "0" : std::to_string(json.size())) + " lazy log pool usedBytes \\(\\d+/\\d+\\) " +
+                             "highWater \\(\\d+/\\d+\\) elapsedTime [0-9.]+(ns|us|ms|s)";
+      EXPECT_TRUE(std::regex_match(lines[i], std::regex(expected))) << lines[i];
+    }
+  }
+  VekLogger::SetSink(previous);
+  EXPECT_EQ(pool.GetUsedBytes(), 0u);
+}
+
+TEST_F(LazyDictTest, FormsHoldingTheSameObjectAreEqual) {
+  SourceCounts counts;
+  const char* forms[] = {"dict0", "json0", "pb0", "object0", "dictionary0", "source0"};
+  for (const char* left : forms) {
+    for (const char* right : forms) {
+      EXPECT_TRUE(*MakePayload(&poolM, left, &counts) == *MakePayload(&poolM, right, &counts)) << left << right;
+    }
+    ref<LazyDict> changed = MakePayload(&poolM, "object0", &counts);
+    static_cast<sarnschema::Address*>(changed->objectM.Get())->cityM = "Bergen";
+    EXPECT_TRUE(*MakePayload(&poolM, left, &counts) != *changed) << left;
+  }
+  EXPECT_TRUE(*LazyDict::FromJsonString(&poolM, VekString("{\"type\": \"x\", \"n\": 1}"), 0) !=
+              *LazyDict::FromJsonString(&poolM, VekString("{\"type\": \"x\", \"n\": \"1\"}"), 0));
 }
 
 TEST_F(LazyDictTest, FirstByteChoosesTheForm) {

@@ -113,9 +113,12 @@ ref<SarnObject> BytesourceToObject(const LazyDict& payload, VekString& error) {
   bool isDirect = VekFeatures::FEnabled(kDirectJsonFeature);
   ref<Dictionary> tree;
   ref<SarnObject> object;
+  size_t bytesRead = 0;
   // The direct reader of JSON objects is not in this build yet: the same result through a tree.
-  if (internal::ReadBytesource(payload, tree, error)) object = TreeToObject(payload, tree, error);
-  return log.Report(isDirect ? "new REP_BYTESOURCE" : "old REP_BYTESOURCE", 0, object);
+  if (internal::ReadBytesource(payload, tree, error, isDirect ? &bytesRead : nullptr)) {
+    object = TreeToObject(payload, tree, error);
+  }
+  return log.Report(isDirect ? "new REP_BYTESOURCE" : "old REP_BYTESOURCE", bytesRead, object);
 }
 
 }  // namespace
