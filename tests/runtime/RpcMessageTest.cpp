@@ -42,6 +42,7 @@ struct RpcMessageTest : sarntest::PoolTest {
     body.erase(body.find_last_not_of(' ') + 1);
     auto n = RequestWrapper::ResponseCount(count == "single" ? 1 : count == "multiple" ? 2 : 0);
     ref<SarnObject> object = sarnschema::KernoCurrentTimeGet::Factory(&poolM);
+    if (body.rfind("len ", 0) == 0) body = "{\"a\": \"" + std::string(std::stoul(body.substr(4)) - 9, 'x') + "\"}";
     ref<LazyDict> payload = body == "null" ? nullptr : LazyDict::FromJsonString(&poolM, S(body), version);
     if (kind == "cancel") return CancelWrapper::New(&poolM, rpc, nullptr);
     if (body == "object" && kind == "request") return RequestWrapper::New(&poolM, rpc, n, version, object, nullptr);
@@ -74,6 +75,30 @@ struct RpcMessageTest : sarntest::PoolTest {
     ref<LazyDict> body = Body(w, &contentType);
     return Str(w->HeadersToDict(&poolM)->ToString(false)) + " v" + std::to_string(w->schemaVersionM) + " " +
            Str(w->GetTypeName()) + (contentType == "-" ? "" : " ct=" + Str(contentType) + " body=" + BodyText(body));
+  }
+
+  // The four writers on one message: "ok" when all wrote the same frame, else what each appended
+  // to "prior", having left the buffer, the string and the sink untouched.
+  std::string WriteAll(const ref<KernoRpcWrapper>& w, bool isSinkFailing = false) {
+    ByteBuffer buffer(&poolM);
+    buffer.AppendString("keep");
+    VekString text = "keep", errors[3] = {"prior", "prior", "prior"};
+    sarntest::StringSink sink;
+    sink.fFailM = isSinkFailing;
+    const bool ok[] = {KernoRpcV2::MarshalToString(w, buffer, errors[0], &poolM, false),
+                       KernoRpcV2::MarshalToString(w, text, errors[1], &poolM, false),
+                       KernoRpcV2::MarshalToBytesink(w, sink, errors[2], &poolM, false)};
+    const std::string frame = Str(KernoRpcV2::MarshalToString(&poolM, w, false));
+    if (ok[0] && ok[1] && ok[2] && Str(text) == frame && sink.textM == frame && !frame.empty() &&
+        std::string(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength()) == "keep" + frame) {
+      return "ok";
+    }
+    EXPECT_EQ(std::string(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength()), ok[0] ? "keep" + frame : "keep");
+    EXPECT_EQ(Str(text), ok[1] ? frame : "keep");
+    if (!isSinkFailing) {
+      EXPECT_EQ(sink.textM, ok[2] ? frame : "");
+    }
+    return Str(errors[0]) + " / " + Str(errors[1]) + " / " + Str(errors[2]) + " / [" + frame + "]";
   }
 
   static bool Equal(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
@@ -115,6 +140,8 @@ struct RpcMessageTest : sarntest::PoolTest {
       std::string verb, key, value;
       in >> verb >> key >> value;
       if (verb == "add") answers += (q ? q->AddOptionalHeader(S(key), S(value)) : r->AddOptionalHeader(S(key), S(value))) ? "1 " : "0 ";
+      for (long i = 0; verb == "repeat" && i < std::stol(value); ++i) (q ? q->AddOptionalHeader(S(key), S("v")) : r->AddOptionalHeader(S(key), S("v")));
+      if (verb == "addn") q->AddOptionalHeader(S(key), S(std::string(std::stoul(value), 'v')));
       if (verb == "ct") (q ? q->contentTypeM : r->contentTypeM) = S(key);
       if (verb == "tn") r->typeNameM = S(key);
       if (verb == "set" || verb == "setd") {  // key: a=1&type=x&..., or "-" for null
@@ -197,6 +224,84 @@ TEST_F(RpcMessageTest, Readers) {
       }
     }
   }
+}
+
+TEST_F(RpcMessageTest, WriterLimitsAndRefusals) {
+  for (const auto& row : sarntest::ReadTable("rpc/writer-limits.txt", 2)) {
+    std::string ignored;
+    EXPECT_EQ(WriteAll(Apply(row[0], ignored), row[0].find("failing") != std::string::npos), row[1]) << row[0];
+  }
+  // The readers refuse more header lines than the platform's arrays hold, rather than drop any.
+  for (size_t lines : {size_t(65535), size_t(65536)}) {
+    std::string block = "RpcId: 1\r\nType: response\r\n";
+    for (size_t i = 2; i < lines; ++i) block += "X: v\r\n";
+    const std::string frame = Frame(block + "\r\n##{}");
+    for (int reader : {0, 2, 4}) {
+      const std::string got = ReadText(reader, frame);
+      EXPECT_EQ(got.rfind("error", 0) == 0 ? got : "accepted",
+                lines == 65535 ? "accepted" : "error Kerno Rpc frame holds more than 65535 header lines.");
+    }
+  }
+}
+
+TEST_F(RpcMessageTest, Packetizer) {
+  const std::string frame = Frame(sarntest::ReadTable("rpc/frames.txt", 3)[0][1]), junk = "GET / HTTP/1.1\r\n\r\n";
+  for (bool isBytes : {false, true}) {
+    KernoRpcV2Packetizer packetizer(&poolM);
+    auto update = [&](const std::string& input) {
+      isBytes ? packetizer.UpdateInputBytestring(vek::ByteBuffer::New(&poolM, input.data(), input.size()))
+              : packetizer.UpdateInput(S(input));
+      return std::to_string(packetizer.decidedM) + std::to_string(packetizer.completeM) + " " +
+             std::to_string(packetizer.GetPacketLength()) + " " + Str(packetizer.errorStringM);
+    };
+    for (size_t n = 0; n <= frame.size(); ++n) {  // decided at the first CR LF, complete only when whole
+      EXPECT_EQ(update(frame.substr(0, n)), (n < 15 ? "00 0 " : n < 181 ? "10 0 " : "11 181 ")) << n;
+    }
+    std::string input = frame + frame + frame.substr(0, 20);
+    for (const char* expected : {"11 181 ", "11 181 ", "10 0 "}) {
+      EXPECT_EQ(update(input), expected);
+      input.erase(0, packetizer.GetPacketLength());
+      packetizer.Reset();
+    }
+    EXPECT_EQ(update(junk + "x"), "11 19 First line of message does not start with 'MRPC/2'");
+    packetizer.Reset();
+    EXPECT_EQ(update("MRPC/2 1"), "00 0 First line of message does not start with 'MRPC/2'");
+  }
+  size_t length = 0;
+  VekString error = "prior";
+  EXPECT_FALSE(KernoRpcV2::IsCompleteString(&poolM, S(frame.substr(0, 10)), length, error));
+  EXPECT_TRUE(KernoRpcV2::IsCompleteString(&poolM, S(frame + "xyz"), length, error));
+  EXPECT_EQ(std::to_string(length) + Str(error), "181");
+  EXPECT_TRUE(KernoRpcV2::IsCompleteString(&poolM, S(std::string(30, 'x')), length, error));
+  EXPECT_EQ(std::to_string(length) + Str(error), "30First line too long");
+}
+
+TEST_F(RpcMessageTest, ByteSourceReaderSplitsFailuresAndLargeBodies) {
+  const std::string frame = Frame(sarntest::ReadTable("rpc/frames.txt", 3)[0][1]);
+  for (int reader = 2; reader < 5; ++reader) {
+    const std::string expected = ReadText(reader, frame);
+    sarntest::ForEachSplit(frame, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
+      sarntest::TestSource source(chunks);
+      VekString error;
+      EXPECT_EQ(Describe(Impl::UnmarshalFromBytesource(&poolM, source, kSettings[reader - 2], error)) + Str(error),
+                expected) << label;
+    });
+    // A pool that fails at any allocation fails the read (a body never decompresses short).
+    sarntest::SweepAllocationFailures(&poolM, [&](VekMempool*, const std::function<void()>& endOfRun) {
+      VekString error;
+      ref<KernoRpcWrapper> w = Read(reader, frame, error);
+      endOfRun();
+      return sarntest::Outcome{static_cast<bool>(w), w ? Describe(w) : Str(error)};
+    }, "");
+  }
+  // A 5 MB body stays compressed until asked for, and comes back exactly.
+  const size_t before = poolM.GetUsedBytes();
+  const std::string body = "{\"a\": \"" + std::string(5242880 - 9, 'x') + "\"}";
+  VekString error;
+  ref<KernoRpcWrapper> w = Read(2, Frame("RpcId: 1\r\nType: response\r\n\r\n##" + body), error);
+  EXPECT_LT(poolM.GetUsedBytes() - before, 64u * 1024);
+  EXPECT_TRUE(dynamic_cast<wynbaselib::GunzipBytesource*>(Body(w)->pBytesourceM) != nullptr);
+  EXPECT_TRUE(BodyText(Body(w)) == body);
 }
 
 }  // namespace

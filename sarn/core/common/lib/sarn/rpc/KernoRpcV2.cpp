@@ -169,8 +169,11 @@ ref<Dict> ReadHeaderBlock(VekMempool* pool, const char* begin, const char* end, 
       const char* valueBegin = colon + 1;
       const char* valueEnd = lineEnd;
       Trim(valueBegin, valueEnd);
-      if (!headers->AddString(VekString::FromUtf8Bytes(pool, static_cast<size_t>(colon - begin), begin),
-                              VekString::FromUtf8Bytes(pool, static_cast<size_t>(valueEnd - valueBegin), valueBegin))) {
+      const VekString key = VekString::FromUtf8Bytes(pool, static_cast<size_t>(colon - begin), begin);
+      const VekString value = VekString::FromUtf8Bytes(pool, static_cast<size_t>(valueEnd - valueBegin), valueBegin);
+      // A string the pool could not make comes back empty.
+      if (key.NByte() != static_cast<size_t>(colon - begin) ||
+          value.NByte() != static_cast<size_t>(valueEnd - valueBegin) || !headers->AddString(key, value)) {
         Replace(pool, error, kOutOfMemoryMessage);
         return nullptr;
       }

@@ -81,8 +81,11 @@ void KernoRpcV2BytestreamImpl::OnHeaderPair(const char* key, const char* value) 
   if (errorM) return;
   // Every pair is one more value in the platform's arrays: refuse the frame rather than drop one.
   if (++headerLinesM > kMaxValuesPerContainer) return Fail(kRpcHeaderLineLimitMessage);
-  if (!headersM->AddString(VekString::FromUtf8Bytes(pMempoolM, std::strlen(key), key),
-                           VekString::FromUtf8Bytes(pMempoolM, std::strlen(value), value))) {
+  const size_t keyLength = std::strlen(key), valueLength = std::strlen(value);
+  const VekString keyText = VekString::FromUtf8Bytes(pMempoolM, keyLength, key);
+  const VekString valueText = VekString::FromUtf8Bytes(pMempoolM, valueLength, value);
+  // A string the pool could not make comes back empty.
+  if (keyText.NByte() != keyLength || valueText.NByte() != valueLength || !headersM->AddString(keyText, valueText)) {
     Fail(kOutOfMemoryMessage);
   }
 }

@@ -35,8 +35,11 @@ void StripKeys(Dict& headers, const char* const (&keys)[N]) {
 
 VekString Text(VekMempool* pool, const char* text) { return VekString::FromUtf8Bytes(pool, std::strlen(text), text); }
 
-bool AddText(Dict& headers, VekMempool* pool, const char* key, const VekString& value) {
-  return headers.AddString(Text(pool, key), value);
+// A pool that cannot make a string gives an empty one: a key, or a value that cannot be empty,
+// coming back empty means memory ran out.
+bool AddText(Dict& headers, VekMempool* pool, const char* key, const VekString& value, bool canBeEmpty = false) {
+  const VekString name = Text(pool, key);
+  return !name.FEmpty() && (canBeEmpty || !value.FEmpty()) && headers.AddString(name, value);
 }
 
 // Every value of every optional header, names in byte order, values in stored order.
@@ -149,7 +152,7 @@ ref<Dict> RequestWrapper::RequestHeaders(VekMempool* pool, const char* type) con
       !AddText(*headers, pool, Keys::ResponseCount,
                Text(pool, count < 3 ? kCountTextsG[count] : RpcV2Parser::ResponseCountValues::Multiple)) ||
       !AddText(*headers, pool, Keys::ContentType, Text(pool, RpcV2Parser::ContentTypeValues::ApplicationJson)) ||
-      !AddText(*headers, pool, Keys::RequestType, requestTypeM) || !CopyOptionalHeaders(*headers, optionalHeadersM)) {
+      !AddText(*headers, pool, Keys::RequestType, requestTypeM, true) || !CopyOptionalHeaders(*headers, optionalHeadersM)) {
     return nullptr;
   }
   return headers;
@@ -247,7 +250,7 @@ ref<Dict> ResponseWrapper::HeadersToDict(VekMempool* pool) const {
   if (!headers || !AddText(*headers, pool, Keys::Type, Text(pool, RpcV2Parser::TypeValues::Response)) ||
       !AddText(*headers, pool, Keys::RpcId, Dict::FormatU32(pool, rpcIdM)) ||
       !AddText(*headers, pool, Keys::IsFinal, Dict::FormatBool(pool, isFinalM)) ||
-      !AddText(*headers, pool, Keys::ContentType, contentTypeM) || !CopyOptionalHeaders(*headers, optionalHeadersM)) {
+      !AddText(*headers, pool, Keys::ContentType, contentTypeM, true) || !CopyOptionalHeaders(*headers, optionalHeadersM)) {
     return nullptr;
   }
   return headers;
