@@ -36,6 +36,28 @@ struct Pair {
   sarnmirror::KnownDict mirrorM, mirrorEqualM, mirrorLastDiffersM;
 };
 
+// Byte strings are never equal, so the bodies' optional ones are left out on both sides; false
+// when a required or multi one remains.
+bool DropByteStrings(SarnObject* object) {
+  const StructInfo* info = object->GetStructInfo();
+  bool isOk = true;
+  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+    const FieldInfo& field = info->vFieldInfo[n];
+    if (field.arity == SARN_ARITY_NONE || !IsFieldPresent(object, field)) continue;
+    if (field.dataType == SARN_DATA_TYPE_BYTESTRING) {
+      if (field.arity != SARN_ARITY_OPTIONAL) return false;
+      if (field.flagOffset != 0) reinterpret_cast<unsigned char*>(object)[field.flagOffset] = 0;
+      FieldAccess::PutReference(object, field, nullptr);
+    } else if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT || field.dataType == SARN_DATA_TYPE_SUBDICT) {
+      for (unsigned i = 0; i < FieldAccess::Count(object, field); ++i) {
+        VekCore* inner = FieldAccess::ReferenceAt(object, field, i);
+        if (inner != nullptr) isOk = DropByteStrings(static_cast<SarnObject*>(inner)) && isOk;
+      }
+    }
+  }
+  return isOk;
+}
+
 ref<SarnObject> Read(VekMempool* pool, const std::string& bytes) {
   ProtoBuf codec(pool, Schema::vStructDefG, Schema::nStructDefG);
   ref<SarnObject> object;
@@ -50,6 +72,7 @@ Pair& GetPair(size_t targetBytes) {
   benchbody::Body& body = benchbody::GetBody(targetBytes);
   VekMempool* pool = &body.poolM;
   pair.reset(new Pair);
+  if (!DropByteStrings(body.listM.Get())) std::abort();
   ProtoBuf codec(pool, Schema::vStructDefG, Schema::nStructDefG);
   ProtoBufByteOutputStream out;
   codec.MarshalKnownDict(body.listM.Get(), &out);

@@ -1,36 +1,23 @@
 // Version conversion from a table (each envelope to a wrapper, the wrapper back to an envelope,
-// that envelope through the binary form, and back to an equal wrapper), then what is shared rather
-// than copied, and the cases a table cannot hold.
+// that envelope through the binary form and round again), then what is shared rather than copied
+// and the envelope reader's refusal of a converted envelope.
 #include <gtest/gtest.h>
 
-#include <sstream>
-
 #include "runtime/ObjectOpsSupport.h"
-#include "testutil/TestUtil.h"
 
-using namespace sarn;
 using namespace objopstest;
-using sarntest::Str;
 
 namespace {
 
 // Type name, rpc id, schema version; then kind, response count and the body's version, or finality.
 std::string Summary(const ref<KernoRpcWrapper>& w) {
-  if (!w) return "null";
   std::ostringstream out;
-  out << Str(w->GetTypeName()) << " " << w->rpcIdM << " " << w->schemaVersionM;
+  if (w) out << Str(w->GetTypeName()) << " " << w->rpcIdM << " " << w->schemaVersionM;
   if (auto* r = dynamic_cast<RequestWrapper*>(w.Get())) {
     out << (dynamic_cast<RequestUpdateWrapper*>(r) ? " update " : " request ") << r->responseCountM << " " << r->bodyM->versionM;
   }
   if (auto* r = dynamic_cast<ResponseWrapper*>(w.Get())) out << " response " << r->isFinalM;
-  return out.str();
-}
-
-bool SameWrapper(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-  auto *ra = dynamic_cast<RequestWrapper*>(a.Get()), *rb = dynamic_cast<RequestWrapper*>(b.Get());
-  auto *sa = dynamic_cast<ResponseWrapper*>(a.Get()), *sb = dynamic_cast<ResponseWrapper*>(b.Get());
-  auto *ca = dynamic_cast<CancelWrapper*>(a.Get()), *cb = dynamic_cast<CancelWrapper*>(b.Get());
-  return (ra && rb && *ra == *rb) || (sa && sb && *sa == *sb) || (ca && cb && *ca == *cb);
+  return w ? out.str() : "null";
 }
 
 }  // namespace
@@ -47,14 +34,12 @@ TEST(KernoRpcV2Convert, EnvelopesAndWrappersBothWays) {
     EXPECT_EQ(Summary(wrapper), row[1]) << row[0];
     ref<SarnObject> back = KernoRpcV2::KernoRpcV2ToV1(&pool, wrapper);
     EXPECT_EQ(back ? Str(back->ToString(false, 0)) : "-", row[2]) << row[0];
-    if (!back) continue;
-    EXPECT_TRUE(*BinaryCopy(&pool, back.Get()) == *back) << row[0];
-    EXPECT_TRUE(SameWrapper(KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, back), wrapper)) << row[0];
+    EXPECT_TRUE(!back || (*BinaryCopy(&pool, back.Get()) == *back &&
+                          *KernoRpcV2::KernoRpcV2ToV1(&pool, KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, back)) == *back)) << row[0];
   }
-  EXPECT_TRUE(KernoRpcV2::KernoRpcV2ToV1(&pool, nullptr) == nullptr);
-  const FieldInfo* field;
-  EXPECT_EQ(Summary(KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, Side(&pool, "kernoRpcRequest.request", "json:{\"type\": ", field))),
-            "error 0 0 request 1 0");
+  const FieldInfo* f;
+  EXPECT_EQ(Summary(KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, Side(&pool, "kernoRpcRequest.request", "json:{\"type\": ", f))), "error 0 0 request 1 0");
+  EXPECT_TRUE(!KernoRpcV2::KernoRpcV2ToV1(&pool, nullptr) && !KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, nullptr));
 }
 
 TEST(KernoRpcV2Convert, BodiesAndHeadersAreSharedNotCopied) {
@@ -62,10 +47,9 @@ TEST(KernoRpcV2Convert, BodiesAndHeadersAreSharedNotCopied) {
   ref<LazyDict> body = LazyDict::FromJsonString(&pool, VekString(("{\"type\": \"success\", \"message\": \"" + std::string(1 << 20, 'x') + "\"}").c_str()), 42);
   ref<Dict> headers = Dict::New(&pool, VekString());
   ref<KernoRpcWrapper> request = RequestWrapper::New(&pool, 1, VekString("success"), RequestWrapper::ResponseCountSingle, 42, body, headers);
-  ref<SarnObject> response = FromJson(&pool, R"({"type": "kernoRpcResponse", "rpcId": 2, "response": {"type": "success"}})");
-  auto* v1Response = static_cast<sarnschema::KernoRpcResponse*>(response.Get());
-  v1Response->responseM = body;
-  v1Response->headersM = headers;
+  ref<SarnObject> response = sarnschema::KernoRpcResponse::Factory(&pool);
+  static_cast<sarnschema::KernoRpcResponse*>(response.Get())->responseM = body;
+  static_cast<sarnschema::KernoRpcResponse*>(response.Get())->headersM = headers;
   const size_t used = pool.GetUsedBytes();
   ref<SarnObject> v1 = KernoRpcV2::KernoRpcV2ToV1(&pool, request);
   ref<KernoRpcWrapper> v2 = KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, response);
@@ -74,8 +58,9 @@ TEST(KernoRpcV2Convert, BodiesAndHeadersAreSharedNotCopied) {
   auto* v2Response = static_cast<ResponseWrapper*>(v2.Get());
   EXPECT_TRUE(v1Request->requestM == body && v1Request->headersM == headers && v2Response->bodyM == body && v2Response->optionalHeadersM == headers);
   ProtoBufByteOutputStream out;  // an envelope with headers, refused by the envelope reader
-  ProtoBuf(&pool, Schema::vStructDefG, Schema::nStructDefG).MarshalKnownDict(v1.Get(), &out);
-  std::string bytes = sarntest::Finished(out);
-  ref<SarnObject> read = ProtoBuf(&pool, Schema::vStructDefG, Schema::nStructDefG).UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
+  ProtoBuf codec(&pool, Schema::vStructDefG, Schema::nStructDefG);
+  codec.MarshalKnownDict(v1.Get(), &out);
+  const std::string bytes = sarntest::Finished(out);
+  ref<SarnObject> read = codec.UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
   EXPECT_EQ(Str(static_cast<sarnschema::Error*>(read.Get())->textM), "wrapper did not unmarshal");
 }

@@ -4,6 +4,8 @@
 // request type must be read out of it.
 #include "sarn/rpc/KernoRpcV2.h"
 
+#include <typeinfo>
+
 #include "schema/KernoRpcCancel.h"
 #include "schema/KernoRpcHello.h"
 #include "schema/KernoRpcRequest.h"
@@ -33,18 +35,31 @@ bool RequestBody(VekMempool* pool, const ref<LazyDict>& payload, KernoVersion ve
   return static_cast<bool>(body);
 }
 
+// The wrapper as a T when it is one: the four classes themselves by their type_info (a pointer
+// comparison, where a dynamic_cast down a chain of four costs more than the envelope's own
+// allocation), classes derived from them by dynamic_cast.
+template <class T>
+T* As(KernoRpcWrapper* wrapper, const std::type_info& kind, bool isOwnClass) {
+  if (isOwnClass) return kind == typeid(T) ? static_cast<T*>(wrapper) : nullptr;
+  return dynamic_cast<T*>(wrapper);
+}
+
 }  // namespace
 
 ref<SarnObject> KernoRpcV2::KernoRpcV2ToV1(VekMempool* pool, const ref<KernoRpcWrapper>& message) {
   ref<SarnObject> out;
   KernoRpcWrapper* wrapper = message.Get();
-  if (auto* update = dynamic_cast<RequestUpdateWrapper*>(wrapper)) {
+  if (wrapper == nullptr) return out;
+  const std::type_info& kind = typeid(*wrapper);
+  const bool isOwn = kind == typeid(RequestUpdateWrapper) || kind == typeid(RequestWrapper) ||
+                     kind == typeid(ResponseWrapper) || kind == typeid(CancelWrapper);
+  if (auto* update = As<RequestUpdateWrapper>(wrapper, kind, isOwn)) {
     if (auto* v1 = NewEnvelope<sarnschema::KernoRpcRequestUpdate>(pool, out)) {
       v1->rpcIdM = static_cast<int32_t>(update->rpcIdM);
       v1->requestM = update->bodyM;
       v1->headersM = update->optionalHeadersM;
     }
-  } else if (auto* request = dynamic_cast<RequestWrapper*>(wrapper)) {
+  } else if (auto* request = As<RequestWrapper>(wrapper, kind, isOwn)) {
     if (auto* v1 = NewEnvelope<sarnschema::KernoRpcRequest>(pool, out)) {
       v1->rpcIdM = static_cast<int32_t>(request->rpcIdM);
       v1->monitorFutureChangesM = request->responseCountM == RequestWrapper::ResponseCountMultiple;
@@ -54,14 +69,14 @@ ref<SarnObject> KernoRpcV2::KernoRpcV2ToV1(VekMempool* pool, const ref<KernoRpcW
       v1->kernoVersionM = request->schemaVersionM;
       v1->requestM = request->bodyM;
     }
-  } else if (auto* response = dynamic_cast<ResponseWrapper*>(wrapper)) {
+  } else if (auto* response = As<ResponseWrapper>(wrapper, kind, isOwn)) {
     if (auto* v1 = NewEnvelope<sarnschema::KernoRpcResponse>(pool, out)) {
       v1->rpcIdM = static_cast<int32_t>(response->rpcIdM);
       v1->responseM = response->bodyM;
       v1->isFinalResponseM = response->IsFinalResponse();
       v1->headersM = response->optionalHeadersM;
     }
-  } else if (auto* cancel = dynamic_cast<CancelWrapper*>(wrapper)) {
+  } else if (auto* cancel = As<CancelWrapper>(wrapper, kind, isOwn)) {
     if (auto* v1 = NewEnvelope<sarnschema::KernoRpcCancel>(pool, out)) v1->rpcIdM = static_cast<int32_t>(cancel->rpcIdM);
   }
   return out;
