@@ -9,15 +9,13 @@ using namespace objopstest;
 
 namespace {
 
-// Type name, rpc id, schema version; then kind, response count and the body's version, or finality.
-std::string Summary(const ref<KernoRpcWrapper>& w) {
-  std::ostringstream out;
-  if (w) out << Str(w->GetTypeName()) << " " << w->rpcIdM << " " << w->schemaVersionM;
-  if (auto* r = dynamic_cast<RequestWrapper*>(w.Get())) {
-    out << (dynamic_cast<RequestUpdateWrapper*>(r) ? " update " : " request ") << r->responseCountM << " " << r->bodyM->versionM;
-  }
-  if (auto* r = dynamic_cast<ResponseWrapper*>(w.Get())) out << " response " << r->isFinalM;
-  return w ? out.str() : "null";
+// The wrapper's ToString, then " v" and its schema version, then "/" and its body's.
+std::string Summary(VekMempool* pool, const ref<KernoRpcWrapper>& w) {
+  auto* request = dynamic_cast<RequestWrapper*>(w.Get());
+  auto* response = dynamic_cast<ResponseWrapper*>(w.Get());
+  const ref<LazyDict> body = request ? request->bodyM : response ? response->bodyM : nullptr;
+  if (!w) return "null";
+  return Str(w->ToString(pool)) + " v" + std::to_string(w->schemaVersionM) + (body ? "/" + std::to_string(body->versionM) : "");
 }
 
 }  // namespace
@@ -31,14 +29,15 @@ TEST(KernoRpcV2Convert, EnvelopesAndWrappersBothWays) {
     const FieldInfo* body = v1 ? FieldNamed(v1->GetStructInfo(), v1->GetTypeId() == 976 ? "response" : "request") : nullptr;
     if (body != nullptr && FieldAccess::ReferenceAt(v1.Get(), *body, 0) != nullptr) FieldRef<ref<LazyDict>>(v1.Get(), *body)->versionM = 33;
     ref<KernoRpcWrapper> wrapper = KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, v1);
-    EXPECT_EQ(Summary(wrapper), row[1]) << row[0];
+    EXPECT_EQ(Summary(&pool, wrapper), row[1]) << row[0];
     ref<SarnObject> back = KernoRpcV2::KernoRpcV2ToV1(&pool, wrapper);
     EXPECT_EQ(back ? Str(back->ToString(false, 0)) : "-", row[2]) << row[0];
     EXPECT_TRUE(!back || (*BinaryCopy(&pool, back.Get()) == *back &&
                           *KernoRpcV2::KernoRpcV2ToV1(&pool, KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, back)) == *back)) << row[0];
   }
   const FieldInfo* f;
-  EXPECT_EQ(Summary(KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, Side(&pool, "kernoRpcRequest.request", "json:{\"type\": ", f))), "error 0 0 request 1 0");
+  ref<KernoRpcWrapper> bad = KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, Side(&pool, "kernoRpcRequest.request", "json:{\"type\": ", f));
+  EXPECT_EQ(Str(bad->GetTypeName()), "error");
   EXPECT_TRUE(!KernoRpcV2::KernoRpcV2ToV1(&pool, nullptr) && !KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, nullptr));
 }
 
