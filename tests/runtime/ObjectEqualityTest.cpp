@@ -34,8 +34,14 @@ TEST(ObjectEquality, RulesFromTable) {
   EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }
 
-TEST(ObjectEquality, DepthUsesNoCStack) {
+// Depth compares without C stack; arrays are read with their own element widths.
+TEST(ObjectEquality, DepthAndArrayWidths) {
   VekMempool pool("deep");
+  VekGenericIntArray narrow(4, &pool, 0), wide(8, &pool, 0);
+  for (uint64_t value : {uint64_t{7}, uint64_t{0xFFFFFFFF}}) narrow.Add(&value), wide.Add(&value);
+  const FieldInfo* ints = FieldNamed(StructInfoForId(1259), "intMulti");
+  EXPECT_TRUE(SarnObject::MultiFieldEquals(ints, &narrow, &wide) && SarnObject::MultiFieldEquals(ints, &wide, &narrow));
+  EXPECT_FALSE(SarnObject::MultiFieldEquals(FieldNamed(StructInfoForId(1259), "floatMulti"), &narrow, &wide));
   const int depth = 10 * JsonLimits::kDefaultMaxDepth;
   ref<SarnObject> a = Nest(&pool, depth, "bottom"), b = Nest(&pool, depth, "bottom"), c = Nest(&pool, depth, "other");
   sarntest::RunOnStack(256 * 1024, [&] { EXPECT_TRUE(*a == *b && *a != *c && *c != *a); });
