@@ -71,20 +71,20 @@ constexpr uint32_t kLazyG = 1u << SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
 constexpr uint32_t kPathDifferencesG = kLazyG | 1u << SARN_DATA_TYPE_ANY_DICT | 1u << SARN_DATA_TYPE_SUBDICT;
 
 // True when a dictionary of the tree repeats a name.
-bool RepeatsName(const Dictionary& dictionary) {
-  VekStringArray names(nullptr);
-  dictionary.GetSortedNames(names);
-  for (int i = 0; i < names.Count(); ++i) {
-    if (dictionary.CountValues(names[i]) > 1) return true;
-    ref<Dictionary> inner = dictionary.GetDictionary(names[i]);
-    if (inner && RepeatsName(*inner)) return true;
-    ref<ArrayValue> array = dictionary.GetArray(names[i]);
-    for (unsigned k = 0; array && k < array->CountValues(); ++k) {
-      ref<DictValue> element = array->GetValueAt(k);
-      if (element && element->kindM == DictValue::KIND_DICTIONARY && RepeatsName(static_cast<Dictionary&>(*element))) {
-        return true;
-      }
+bool RepeatsName(const DictValue* value) {
+  if (value == nullptr) return false;
+  if (value->kindM == DictValue::KIND_ARRAY) {
+    const auto* array = static_cast<const ArrayValue*>(value);
+    for (unsigned k = 0; k < array->CountValues(); ++k) {
+      if (RepeatsName(array->GetValueAt(k).Get())) return true;
     }
+  }
+  if (value->kindM != DictValue::KIND_DICTIONARY) return false;
+  const auto* dictionary = static_cast<const Dictionary*>(value);
+  VekStringArray names(nullptr);
+  dictionary->GetSortedNames(names);
+  for (int i = 0; i < names.Count(); ++i) {
+    if (dictionary->CountValues(names[i]) > 1 || RepeatsName(dictionary->Get(names[i]).Get())) return true;
   }
   return false;
 }
@@ -134,7 +134,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
     ref<SarnObject> viaTree;
     if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return 0;
-    if (Holds(memory.objectM.Get(), kPathDifferencesG) || RepeatsName(*tree)) return 0;
+    if (Holds(memory.objectM.Get(), kPathDifferencesG) || RepeatsName(tree.Get())) return 0;
     Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == memory.textM);
   }
   return 0;
