@@ -20,20 +20,21 @@ inline void Append(VekMempool* pool, VekString& error, const char* piece) { Appe
 
 // Skip, then take one byte (0 at the end of the input).
 inline char Take(InputPointerBytesource& input) {
-  input.SkipWhitespace();
+  Skip(input);
   return input.Next();
 }
 inline char SkipPeek(InputPointerBytesource& input) {
-  input.SkipWhitespace();
+  Skip(input);
   return input.Peek();
 }
 inline bool IsAlnum(char c) { return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z'); }
 
-// FNV-1a over the bytes of a name.
+// A hash of a name from its length and three of its bytes: field names of one type rarely share
+// all four, and probing sorts out the rest.
 inline uint32_t NameHash(const unsigned char* p, size_t n) {
-  uint32_t h = 2166136261u;
-  for (size_t i = 0; i < n; ++i) h = (h ^ p[i]) * 16777619u;
-  return h;
+  if (n == 0) return 0;
+  uint32_t h = static_cast<uint32_t>(n) * 0x9E3779B1u ^ (p[0] | p[n / 2] << 8 | p[n - 1] << 16);
+  return (h * 0x85EBCA6Bu) >> 7;
 }
 
 
@@ -47,6 +48,7 @@ struct JsonSarnObject::ReadState {
   struct NameIndex {
     const StructInfo* pTypeM;
     uint16_t* vSlotM;  // field number + 1, 0 for an empty slot
+    uint16_t* vLengthM;  // per slot: the length of the field's name
     uint32_t maskM;
   };
   static constexpr unsigned kIndexes = 64;
@@ -66,10 +68,7 @@ struct JsonSarnObject::ReadState {
       unsigned entry = index.vSlotM[slot];
       if (entry == 0) return nullptr;
       const FieldInfo& field = type->vFieldInfo[entry - 1];
-      const char* name = FieldName(type, field);
-      if (std::strncmp(name, reinterpret_cast<const char*>(key), n) == 0 && name[n] == '\0') {
-        return &field;
-      }
+      if (index.vLengthM[slot] == n && std::memcmp(FieldName(type, field), key, n) == 0) return &field;
     }
   }
   static const FieldInfo* LinearFind(const StructInfo* type, const unsigned char* key, size_t n) {
@@ -88,21 +87,24 @@ struct JsonSarnObject::ReadState {
   bool Build(NameIndex& index, const StructInfo* type) {
     uint32_t size = 8;
     while (size < 2u * type->nFieldInfo) size *= 2;
-    auto* slots = static_cast<uint16_t*>(VekMempool::Default()->Calloc(size, sizeof(uint16_t)));
+    auto* slots = static_cast<uint16_t*>(VekMempool::Default()->Calloc(2 * size, sizeof(uint16_t)));
     if (slots == nullptr) return false;
     VekMempool::Default()->Free(index.vSlotM);
     index.pTypeM = type;
     index.vSlotM = slots;
+    index.vLengthM = slots + size;
     index.maskM = size - 1;
     for (unsigned i = 0; i < type->nFieldInfo; ++i) {
       const FieldInfo& field = type->vFieldInfo[i];
       if (field.arity == SARN_ARITY_NONE) continue;
       const char* name = FieldName(type, field);
       size_t n = std::strlen(name);
+      if (n > UINT16_MAX) return false;  // no index for such a type: it is searched linearly
       for (uint32_t slot = internal::NameHash(reinterpret_cast<const unsigned char*>(name), n) & index.maskM;;
            slot = (slot + 1) & index.maskM) {
         if (slots[slot] == 0) {
           slots[slot] = static_cast<uint16_t>(i + 1);
+          index.vLengthM[slot] = static_cast<uint16_t>(n);
           break;
         }
         if (std::strcmp(FieldName(type, type->vFieldInfo[slots[slot] - 1]), name) == 0) break;  // the first stays

@@ -9,6 +9,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <cstring>
 
 #include "sarn/values/Json.h"
@@ -26,14 +27,33 @@ struct BareTokenBytes {
 };
 inline constexpr BareTokenBytes kBareTokenBytesG;
 
-// The end of a quoted run at `p`: the first closing quote, backslash or NUL before `end`.
+// The end of a quoted run at `p`: the first closing quote, backslash or NUL before `end`. Eight
+// bytes at a time: a byte of the word is one of the three when the word XORed with its pattern
+// (or the word itself, for NUL) has a zero byte.
 inline const unsigned char* QuotedRunEnd(const unsigned char* p, const unsigned char* end) {
+  constexpr uint64_t kOnes = 0x0101010101010101ull, kHighs = 0x8080808080808080ull;
+  while (end - p >= 8) {
+    uint64_t word;
+    std::memcpy(&word, p, 8);
+    uint64_t quote = word ^ (kOnes * '"'), backslash = word ^ (kOnes * '\\');
+    uint64_t found = ((word - kOnes) & ~word) | ((quote - kOnes) & ~quote) | ((backslash - kOnes) & ~backslash);
+    if ((found & kHighs) != 0) break;
+    p += 8;
+  }
   while (p != end && *p != '"' && *p != '\\' && *p != 0) ++p;
   return p;
 }
 
+// Skips whitespace; the cursor's own (out-of-line) skip runs only at the end of a block.
+inline void Skip(InputPointerBytesource& input) {
+  const unsigned char* p = input.pCurM;
+  while (p != input.pEndM && (*p == ' ' || *p == '\n' || *p == '\r' || *p == '\t')) ++p;
+  input.pCurM = p;
+  if (p == input.pEndM) input.SkipWhitespace();
+}
+
 inline bool SkipToken(InputPointerBytesource& input) {
-  input.SkipWhitespace();
+  Skip(input);
   if (input.Peek() != '"') {
     for (;;) {
       const unsigned char* p = input.pCurM;
@@ -72,7 +92,7 @@ struct TokenText {
 };
 
 inline bool ReadToken(VekMempool* pool, InputPointerBytesource& input, TokenText& token) {
-  input.SkipWhitespace();
+  Skip(input);
   const unsigned char* p = input.pCurM;
   const unsigned char* end = input.pEndM;
   if (p != end) {
