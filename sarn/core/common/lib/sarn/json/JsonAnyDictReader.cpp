@@ -30,11 +30,12 @@ bool JsonSarnObject::Reader::AnyValue(JsonSarnObject& self, int depth, InputPoin
   if (SkipPeek(input) != '{') {
     type = dictvalue::TYPE_STRING;
     TokenText token;
-    if (!ReadToken(pool, input, token)) {
+    VekString& hold = State(self)->holdM;
+    if (!ReadToken(pool, input, token, hold)) {
       Replace(self, error, kAnyBadStringG);
       return false;
     }
-    text = token.holdM.FEmpty() ? VekString::FromUtf8Bytes(pool, token.nM, token.pM) : token.holdM;
+    text = internal::TokenString(pool, token, hold);
     return true;
   }
   type = dictvalue::TYPE_DICT;
@@ -121,7 +122,9 @@ bool JsonSarnObject::UnmarshalAnyDict(int depth, InputPointerBytesource& input, 
   dictvalue::Type type = dictvalue::TYPE_NONE;
   VekString text;
   ref<Dict> dict;
-  if (!Reader::AnyValue(*this, depth, input, type, text, dict, error) || type != dictvalue::TYPE_DICT) return false;
+  bool isOk = Reader::AnyValue(*this, depth, input, type, text, dict, error) && type == dictvalue::TYPE_DICT;
+  pReadStateM->holdM = VekString();
+  if (!isOk) return false;
   if (result != nullptr) *result = dict;
   return true;
 }

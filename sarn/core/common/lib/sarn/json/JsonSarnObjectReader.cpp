@@ -75,6 +75,7 @@ void JsonSarnObject::ReleaseReadState() {
   if (pReadStateM == nullptr) return;
   for (auto& index : pReadStateM->vIndexM) VekMempool::Default()->Free(index.vSlotM);
   VekMempool::Default()->Free(pReadStateM->pKeysM);
+  pReadStateM->holdM = VekString();
   VekMempool::Default()->Free(pReadStateM);
   pReadStateM = nullptr;
 }
@@ -97,7 +98,8 @@ bool JsonSarnObject::Reader::TooDeep(JsonSarnObject& self, int level, VekString&
 bool JsonSarnObject::Reader::RecordType(JsonSarnObject& self, InputPointerBytesource& input, uint32_t ordinal,
                                         VekString& error) {
   TokenText name;
-  if (!ReadToken(self.pMempoolM, input, name)) {
+  VekString& hold = State(self)->holdM;
+  if (!ReadToken(self.pMempoolM, input, name, hold)) {
     Append(self.pMempoolM, error, kBadTypeG);
     return false;
   }
@@ -110,7 +112,7 @@ bool JsonSarnObject::Reader::RecordType(JsonSarnObject& self, InputPointerByteso
       text[name.nM] = '\0';
       named = StructInfoMap::LookupStructByName(text);
     } else {
-      VekString copy = name.holdM.FEmpty() ? VekString::FromUtf8Bytes(self.pMempoolM, name.nM, name.pM) : name.holdM;
+      VekString copy = internal::TokenString(self.pMempoolM, name, hold);
       named = StructInfoMap::LookupStructByName(copy.Utf8());
     }
   }
@@ -155,7 +157,7 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
     char c = SkipPeek(input);
     if (c != '"' && !IsAlnum(c)) break;
     TokenText key;
-    if (!ReadToken(pool, input, key)) {
+    if (!ReadToken(pool, input, key, state->holdM)) {
       Append(pool, error, kBadKeyG);
       return false;
     }
@@ -167,7 +169,6 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
       return false;
     }
     size_t keyLength = key.nM;
-    key.holdM = VekString();
     if (Take(input) != ':') {
       Append(pool, error, kNoColonG);
       return false;
@@ -388,10 +389,11 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
                                     SarnObject* object, VekString& error) {
   VekMempool* pool = self.pMempoolM;
   TokenText token;
-  if (!ReadToken(pool, input, token)) return false;
+  VekString& hold = State(self)->holdM;
+  if (!ReadToken(pool, input, token, hold)) return false;
   const unsigned char* p = token.pM;
   size_t n = token.nM;
-  auto text = [&]() { return token.holdM.FEmpty() ? VekString::FromUtf8Bytes(pool, n, p) : token.holdM; };
+  auto text = [&]() { return internal::TokenString(pool, token, hold); };
   bool isNegative;
   unsigned long long digits;
   switch (field.dataType) {
@@ -533,13 +535,15 @@ bool JsonSarnObject::Reader::TwoPass(JsonSarnObject& self, InputPointerBytesourc
   if (type != nullptr) {
     self.nObjectIndexM = 0;
     ref<SarnObject> object;
-    if (Object(self, 0, second, type, &object, error)) {
-      if (result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
-      return true;
-    }
+    isOk = Object(self, 0, second, type, &object, error);
+    if (isOk && result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
   }
-  if (result != nullptr) result->Reset();
-  return false;
+  state->holdM = VekString();  // nothing of the read stays in the caller's pool
+  if (type == nullptr || !isOk) {
+    if (result != nullptr) result->Reset();
+    return false;
+  }
+  return true;
 }
 
 bool JsonSarnObject::JsonToSarnObject(InputPointerBytesource& firstPass, InputPointerBytesource& secondPass,

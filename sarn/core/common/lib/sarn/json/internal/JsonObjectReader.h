@@ -58,6 +58,7 @@ struct JsonSarnObject::ReadState {
   size_t capKeysM;
   bool isFirstPassM;      // array elements may be separated by whitespace alone
   bool isDepthRefusedM;   // the nesting limit refused a container: its message must reach the caller
+  VekString holdM;        // the text of the last token that could not be read in place
 
   // The field named [key, key + n) of `type`, or null. A key never holds a NUL (the token reader
   // refuses one in a quoted string and ends a bare token there).
@@ -128,7 +129,8 @@ struct JsonSarnObject::ReadState {
   }
 };
 
-class JsonSarnObject::Reader {
+// Hidden: its functions call each other directly rather than through the library's symbol table.
+class __attribute__((visibility("hidden"))) JsonSarnObject::Reader {
  public:
   static bool Object(JsonSarnObject& self, int depth, InputPointerBytesource& input, const StructInfo* type,
                      ref<SarnObject>* result, VekString& error);

@@ -5,7 +5,7 @@
 // SkipToken gives the same verdict as JsonBytesourceToString and leaves the cursor where it would
 // after a success. ReadToken gives the token's text: in place when it lies wholly in the current
 // block and has no escape (the common case; the bytes stay valid until the cursor reads its next
-// block), otherwise through JsonBytesourceToString into `holder`.
+// block), otherwise through JsonBytesourceToString into `hold`.
 #pragma once
 
 #include <cstddef>
@@ -82,16 +82,25 @@ inline bool SkipToken(InputPointerBytesource& input) {
   }
 }
 
-// A token's text: [pM, pM + nM), in the cursor's block or in holdM.
+// The token as a string in `pool` (`hold` itself when it holds the token).
+struct TokenText;
+inline VekString TokenString(VekMempool* pool, const TokenText& token, const VekString& hold);
+
+// A token's text: [pM, pM + nM), in the cursor's block, or (isHeldM) in the string the reader
+// passed to hold it. Plain data, so that the common case costs no string at all.
 struct TokenText {
   const unsigned char* pM = nullptr;
   size_t nM = 0;
-  VekString holdM;
+  bool isHeldM = false;
 
   bool Is(const char* text, size_t n) const { return nM == n && std::memcmp(pM, text, n) == 0; }
 };
 
-inline bool ReadToken(VekMempool* pool, InputPointerBytesource& input, TokenText& token) {
+inline VekString TokenString(VekMempool* pool, const TokenText& token, const VekString& hold) {
+  return token.isHeldM ? hold : VekString::FromUtf8Bytes(pool, token.nM, token.pM);
+}
+
+inline bool ReadToken(VekMempool* pool, InputPointerBytesource& input, TokenText& token, VekString& hold) {
   Skip(input);
   const unsigned char* p = input.pCurM;
   const unsigned char* end = input.pEndM;
@@ -101,6 +110,7 @@ inline bool ReadToken(VekMempool* pool, InputPointerBytesource& input, TokenText
       if (q != end && *q == '"') {
         token.pM = p + 1;
         token.nM = static_cast<size_t>(q - p - 1);
+        token.isHeldM = false;
         input.pCurM = q + 1;
         return true;
       }
@@ -110,14 +120,16 @@ inline bool ReadToken(VekMempool* pool, InputPointerBytesource& input, TokenText
       if (q != end) {  // otherwise the token may go on in the next block
         token.pM = p;
         token.nM = static_cast<size_t>(q - p);
+        token.isHeldM = false;
         input.pCurM = q;
         return true;
       }
     }
   }
-  if (!JsonBytesourceToString(pool, nullptr, input, token.holdM)) return false;
-  token.pM = reinterpret_cast<const unsigned char*>(token.holdM.Utf8());
-  token.nM = token.holdM.NByte();
+  if (!JsonBytesourceToString(pool, nullptr, input, hold)) return false;
+  token.pM = reinterpret_cast<const unsigned char*>(hold.Utf8());
+  token.nM = hold.NByte();
+  token.isHeldM = true;
   return true;
 }
 
