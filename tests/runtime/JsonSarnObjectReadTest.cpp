@@ -4,6 +4,7 @@
 // objects of every type written, read and written again.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 
@@ -120,7 +121,10 @@ TEST_F(JsonReadTest, LazyMembersKeepTheirExactBytesAcrossBlockBoundaries) {
                                                         static_cast<int>(text.size()), 0, &object, error)
                              : readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error));
       auto* request = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
-      EXPECT_EQ(Captured(request->requestM.Get()) + std::to_string(request->kernoVersionM), member + "9") << shift;
+      // The trailing comma keeps the streaming parser from reading it: written again unchanged.
+      const LazyDict* lazy = request->requestM.Get();
+      EXPECT_EQ(Captured(lazy) + Str(lazy->ToJson(false)) + Str(lazy->ToJson(true)) +
+                    std::to_string(request->kernoVersionM), member + member + member + "9") << shift;
     }
   }
 }
@@ -150,8 +154,13 @@ TEST_F(JsonReadTest, ArraysOfLazyMembersAndAnEchoAlreadyRunning) {
   second.StopEcho();
   auto* items = &static_cast<LazyList*>(static_cast<sarnschema::TestAllTypes*>(object.Get())->structM.Get())->itemsM;
   std::string got = outer.textM + "|" + std::to_string(items->Count());
-  for (int i = 0; i < items->Count(); ++i) got += "|" + Captured(static_cast<LazyDict*>(items->Get(i)));
-  EXPECT_EQ(got, text + "|3|{\"a\":1}|{ }|{\"b\":[{}]}");
+  for (int i = 0; i < items->Count(); ++i) {
+    const auto* lazy = static_cast<LazyDict*>(items->Get(i));
+    got += "|" + Captured(lazy) + " " + Str(lazy->ToJson(false)) + " " + Str(lazy->ToJson(true));
+  }
+  // Written again: compact and pretty through the streaming parser's Dictionary.
+  EXPECT_EQ(got, text + "|3|{\"a\":1} {\"a\": 1} {\n    \"a\": 1\n}|{ } {} {\n}|{\"b\":[{}]} {\"b\": [{}]} "
+                        "{\n    \"b\": [\n        {\n        }\n    ]\n}");
 }
 
 // A text whose containers nest `levels` deep (the top object is the first): objects, arrays or
@@ -204,27 +213,25 @@ TEST_F(JsonReadTest, ObjectAndElementCountsAtThePlatformLimit) {
             "to parse an array member. Failed to parse value for key intMulti");
 }
 
-bool HasLazyField(const StructInfo* info) {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    if (info->vFieldInfo[n].dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) return true;
-  }
-  return false;
-}
-
 TEST_F(JsonReadTest, RandomObjectsOfEveryTypeReadBackAsWritten) {
-  // An empty free-form dictionary is written as {}, which the free-form reader refuses: such
-  // texts must be refused, every other one read back to the same text.
+  // An empty free-form dictionary is written as {}, which the free-form reader refuses: such texts
+  // must be refused. A lazy member is written again from its captured text (through a Dictionary,
+  // so with its members sorted): texts of types with lazy fields must be stable after one read.
   sarntest::RandomObjects random(&poolM, 14, {543, 1259}, 3);
   int nSame = 0;
   for (unsigned round = 0; round < 300; ++round) {
     unsigned typeId = round % 3 == 0 ? 1259 : static_cast<unsigned>(1 + random.Next(1271));
     ref<SarnObject> object = random.Make(typeId);
-    if (!object || HasLazyField(object->GetStructInfo())) continue;
+    if (!object) continue;
     std::string text = Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0));
     std::string again = Memory(text);
     if (text.find("{}") != std::string::npos && again[0] == '!') continue;
-    EXPECT_EQ(again, text) << "type " << typeId;
-    ++nSame;
+    const StructInfo* info = object->GetStructInfo();
+    bool isLazy = std::any_of(info->vFieldInfo, info->vFieldInfo + info->nFieldInfo, [](const FieldInfo& field) {
+      return field.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
+    });
+    EXPECT_EQ(isLazy ? Memory(again) : again, isLazy ? again : text) << "type " << typeId;
+    nSame += !isLazy;
   }
   EXPECT_GT(nSame, 30);
 }

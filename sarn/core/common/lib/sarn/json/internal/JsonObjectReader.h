@@ -122,7 +122,7 @@ struct JsonSarnObject::ReadState {
       pKeysM = keys;
       capKeysM = capacity;
     }
-    std::memcpy(pKeysM + nKeysM, key, n);
+    if (n != 0) std::memcpy(pKeysM + nKeysM, key, n);  // an empty key before any other has no buffer yet
     long at = static_cast<long>(nKeysM);
     nKeysM += n;
     return at;
