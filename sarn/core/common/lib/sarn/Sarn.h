@@ -41,6 +41,10 @@
 #include "sarn/binary/ProtoBuf.h"
 #include "sarn/binary/ProtoBufByteOutputStream.h"
 
+#include "sarn/rpc/KernoRpcV2.h"
+#include "sarn/rpc/KernoRpcV2BytestreamImpl.h"
+#include "sarn/rpc/KernoRpcV2Packetizer.h"
+#include "sarn/rpc/KernoRpcWrapper.h"
 #include "sarn/rpc/RpcV2Parser.h"
 
 // Every generated schema class (namespace sarnschema), from the build tree.

@@ -57,6 +57,12 @@ SARN_EXPORT extern const char kLazyDictDepthLimitFormat[];  // "Lazy payload nes
 constexpr unsigned kMaxValuesPerContainer = 65535;
 SARN_EXPORT extern const char kJsonArrayLimitMessage[];        // "JSON array holds more than 65535 elements."
 SARN_EXPORT extern const char kJsonRepeatedKeyLimitMessage[];  // "JSON object repeats a key more than 65535 times."
+// The object reader records one type per JSON object of a text in a platform array.
+SARN_EXPORT extern const char kJsonObjectCountLimitMessage[];  // "JSON text holds more than 65535 objects."
+
+// A frame holding more header lines than that is refused by the frame readers (the writers
+// refuse such a message as "Kerno Rpc headers are too large").
+SARN_EXPORT extern const char kRpcHeaderLineLimitMessage[];  // "Kerno Rpc frame holds more than 65535 header lines."
 
 // A pool that could not serve an allocation, where the failing operation has no message of its own.
 SARN_EXPORT extern const char kOutOfMemoryMessage[];  // "Out of memory."
