@@ -202,8 +202,7 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
         return object ? ObjectJson(pool, object) : "null: " + Str(error);
       });
     }
-    EXPECT_EQ(results[0], results[1]) << "feature 548";
-    return results[0];
+    return results[0] == results[1] ? results[0] : results[0] + " | 548: " + results[1];
   }
   if (op == "shared") {  // which results are the payload's own members
     ref<Dictionary> own = payload->dictM ? payload->dictM->GetDictionary() : payload->dictionaryM;
