@@ -4,7 +4,8 @@
 set -euo pipefail
 
 packages=(g++ cmake make pkg-config libyajl-dev zlib1g-dev libgtest-dev libbenchmark-dev
-          clang libclang-rt-14-dev rapidjson-dev libhttp-parser-dev libprotobuf-dev protobuf-compiler ccache)
+          clang libclang-rt-14-dev rapidjson-dev libhttp-parser-dev libprotobuf-dev protobuf-compiler ccache
+          doxygen)
 
 missing=()
 for package in "${packages[@]}"; do

@@ -19,8 +19,11 @@ class RandomObjects {
  public:
   // Known dicts and lazy fields hold objects of `knownTypes` (type ids); nested objects stop at
   // `maxDepth` levels, except required ones, which go a few levels further.
-  RandomObjects(VekMempool* pool, uint64_t seed, std::vector<unsigned> knownTypes, int maxDepth = 3)
-      : pPoolM(pool), stateM(seed), knownTypesM(std::move(knownTypes)), maxDepthM(maxDepth) {}
+  // `isWithBytes` false: optional and multi byte strings are left out (equality never takes two
+  // byte strings for equal).
+  RandomObjects(VekMempool* pool, uint64_t seed, std::vector<unsigned> knownTypes, int maxDepth = 3,
+                bool isWithBytes = true)
+      : pPoolM(pool), stateM(seed), knownTypesM(std::move(knownTypes)), maxDepthM(maxDepth), isWithBytesM(isWithBytes) {}
 
   ref<sarn::SarnObject> Make(unsigned typeId) { return Make(typeId, maxDepthM); }
   ref<sarn::SarnObject> MakeKnown() { return Make(knownTypesM[Next(knownTypesM.size())], maxDepthM); }
@@ -43,7 +46,7 @@ class RandomObjects {
       const FieldInfo& field = info->vFieldInfo[n];
       if (field.arity == SARN_ARITY_NONE || field.dataType > SARN_DATA_TYPE_U64) continue;
       bool isRequired = field.arity == SARN_ARITY_REQUIRED;
-      if (!isRequired && Next(3) == 0) continue;
+      if (!isRequired && (Next(3) == 0 || (!isWithBytesM && field.dataType == SARN_DATA_TYPE_BYTESTRING))) continue;
       unsigned count = field.arity == SARN_ARITY_MULTI ? static_cast<unsigned>(Next(4)) : 1;
       bool isSet = true;
       for (unsigned e = 0; e < count && isSet; ++e) isSet = PutValue(object.Get(), field, depth, isRequired);
@@ -147,6 +150,7 @@ class RandomObjects {
   uint64_t stateM;
   std::vector<unsigned> knownTypesM;
   int maxDepthM;
+  bool isWithBytesM;
 };
 
 }  // namespace sarntest

@@ -14,6 +14,7 @@
 // Thread safety: plain values and constant texts.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "sarn/base/Export.h"
@@ -42,12 +43,22 @@ typedef Limits JsonLimits;
 // Refused nesting depth; %d is the limit in force.
 SARN_EXPORT extern const char kJsonDepthLimitFormat[];        // "JSON nesting exceeds the depth limit of %d levels."
 SARN_EXPORT extern const char kDictionaryDepthLimitFormat[];  // "Dictionary nesting exceeds the depth limit of %d levels."
+// Lazy payloads converted inside one another (each level a conversion that a writer, another
+// conversion or a comparison starts) past Limits::kDefaultMaxDepth: the innermost is taken as
+// the "error" object with this text.
+// The same text when those conversions, each one recursing into the next, have taken this much
+// native stack below the outermost one (in optimised builds), whichever comes first: a level can
+// hold a whole tree written recursively, so levels alone do not bound the stack.
+constexpr size_t kLazyNestingStackBytes = 64 * 1024;
+SARN_EXPORT extern const char kLazyDictDepthLimitFormat[];  // "Lazy payload nesting exceeds the depth limit of %d levels."
 
 // The platform arrays under ArrayValue and under one name of a Dictionary hold at most this
 // many values; a reader refuses a document that would need more rather than drop values.
 constexpr unsigned kMaxValuesPerContainer = 65535;
 SARN_EXPORT extern const char kJsonArrayLimitMessage[];        // "JSON array holds more than 65535 elements."
 SARN_EXPORT extern const char kJsonRepeatedKeyLimitMessage[];  // "JSON object repeats a key more than 65535 times."
+// The object reader records one type per JSON object of a text in a platform array.
+SARN_EXPORT extern const char kJsonObjectCountLimitMessage[];  // "JSON text holds more than 65535 objects."
 
 // A frame holding more header lines than that is refused by the frame readers (the writers
 // refuse such a message as "Kerno Rpc headers are too large").

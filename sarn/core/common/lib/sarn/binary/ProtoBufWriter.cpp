@@ -9,6 +9,7 @@
 #include "sarn/binary/internal/Varint.h"
 #include "sarn/dict/DictValue.h"
 #include "sarn/dict/Dictionary.h"
+#include "sarn/dict/internal/LazyDictSupport.h"
 #include "sarn/model/FieldAccess.h"
 #include "sarn/model/internal/ObjectWalk.h"
 #include "sarn/values/ScalarTypes.h"
@@ -25,12 +26,13 @@ struct ProtoBufFrameData {
   int64_t tagM;
   unsigned nSectionsM;
   int64_t fieldTagM;  // the tag of the field being visited
+  int lazyLevelsM;    // payloads converted around this object, each inside the one before
 };
 
 constexpr int64_t kTagOfRecord = -1; // the tag follows from the field number and the wire type
 constexpr int64_t kNoTag = -2;       // the value alone
 
-ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, n, kNoTag}; }
+ProtoBufFrameData Sections(unsigned n) { return ProtoBufFrameData{kTagOfRecord, n, kNoTag, 0}; }
 
 // The tag and sections of a known dict: the type id (0 for no object) as a known-dict tag, then
 // the fields in a section.
@@ -59,7 +61,7 @@ class ProtoBuf::Writer {
   }
   void Run(const SarnObject* object, const FrameData& data) { Run(object, walkM.InfoOf(object), data); }
   void RunField(const FieldInfo& field, const SarnObject* object, int64_t tag) {
-    FrameData data{tag, 0, kNoTag};
+    FrameData data{tag, 0, kNoTag, 0};
     if (!walkM.RunField(*this, object, field, nullptr, 0, data)) Fail();
   }
 
@@ -139,16 +141,22 @@ class ProtoBuf::Writer {
         return true;
       case SARN_DATA_TYPE_SUBDICT:
         outM->StartSection();
-        Descend(child, static_cast<const SarnObject*>(value), 1);
+        Descend(frame, child, static_cast<const SarnObject*>(value), 1);
         return true;
       case SARN_DATA_TYPE_KNOWN_DICT:
         outM->StartSection();
         OpenKnownDictValue(static_cast<const SarnObject*>(value), outM);
-        Descend(child, static_cast<const SarnObject*>(value), 2);
+        Descend(frame, child, static_cast<const SarnObject*>(value), 2);
         return true;
       case SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY: {
         // A payload that cannot be converted gives an error object, which is then what is written.
-        ref<SarnObject> inner = static_cast<const LazyDict*>(value)->ToSarnObjectOrError();
+        // Payloads nested in payloads are converted here one after another, not one inside
+        // another, so the levels around each are counted for it.
+        ref<SarnObject> inner;
+        {
+          internal::LazyNesting around(frame.dataM.lazyLevelsM);
+          inner = static_cast<const LazyDict*>(value)->ToSarnObjectOrError();
+        }
         outM->StartSection();
         OpenKnownDictValue(inner.Get(), outM);
         if (inner == nullptr) {
@@ -157,7 +165,8 @@ class ProtoBuf::Writer {
           return true;
         }
         inner->UpRef();
-        Descend(child, inner.Get(), 2);
+        Descend(frame, child, inner.Get(), 2);
+        ++child.dataM.lazyLevelsM;
         child.isOwnedM = true;
         return true;
       }
@@ -167,9 +176,10 @@ class ProtoBuf::Writer {
   }
 
  private:
-  static void Descend(Child& child, const SarnObject* object, unsigned nSections) {
+  static void Descend(const Frame& frame, Child& child, const SarnObject* object, unsigned nSections) {
     child.pObjectM = object;
     child.dataM = Sections(nSections);
+    child.dataM.lazyLevelsM = frame.dataM.lazyLevelsM;
   }
   // The stack could not grow: the stream's own out-of-memory state, so that Finish gives nothing.
   void Fail() { outM->bytesM.isOutOfMemoryM = true; }

@@ -1,42 +1,207 @@
-// LazyDict: construction, the conversions of the Dict, JSON and Dictionary forms to one another,
-// and the object form as an object.
+// LazyDict: construction, type queries, the byte source, and the conversions to trees and JSON.
+// The conversions to objects and protocol-buffer bytes are in LazyDictConvert.cpp.
 //
-// The object, protocol-buffer and byte-source forms are not converted to dictionaries or JSON:
-// wherever such a conversion meets one of them it takes the branch of an unknown representation,
-// so that their answers are the documented failures rather than something half-done.
+// Every conversion first decides the form it answers as (LazyForm): the payload's own, a bad one
+// when the member of its form is missing, or the "error" object when it runs nested too deep.
+// The switches below then only look at that form.
 #include "sarn/dict/LazyDict.h"
 
+#include <cstring>
+#include <new>
+
+#include "sarn/base/Limits.h"
 #include "sarn/binary/ProtoBuf.h"
+#include "sarn/dict/internal/LazyDictSupport.h"
 #include "sarn/dict/internal/TreeWalk.h"
+#include "sarn/model/StructInfoMap.h"
+#include "sarn/objects/DictionarySarnObject.h"
+#include "vek/VekServices.h"
 
 namespace sarn {
 
 using internal::TreeRelease;
 
+const char kLazyDictNoDuplicateMessage[] = "Byte source could not be duplicated.";
+
+namespace internal {
+
+thread_local int LazyNesting::depthG = 0;
+thread_local const char* LazyNesting::pOutermostG = nullptr;
+
+LazyForm FormOf(const LazyDict& payload, const LazyNesting& nesting) {
+  LazyForm form{payload.repM, ref<SarnObject>()};
+  if (nesting.IsTooDeep()) {
+    form.repM = LazyDict::REP_OBJECT;
+    form.objectM = MakeErrorObject(payload.GetMempool(),
+                                   VekString::Format(payload.GetMempool(), kLazyDictDepthLimitFormat,
+                                                     Limits::kDefaultMaxDepth));
+    if (!form.objectM) form.repM = kBadRep;
+    return form;
+  }
+  bool isHeld = false;
+  switch (payload.repM) {
+    case LazyDict::REP_DICT:
+      isHeld = payload.dictM && payload.dictM->GetDictionary();
+      break;
+    case LazyDict::REP_JSON:
+    case LazyDict::REP_PROTOBUF:
+      isHeld = static_cast<bool>(payload.bytesM);
+      break;
+    case LazyDict::REP_OBJECT:
+      isHeld = static_cast<bool>(payload.objectM);
+      form.objectM = payload.objectM;
+      break;
+    case LazyDict::REP_DICTIONARY:
+      isHeld = static_cast<bool>(payload.dictionaryM);
+      break;
+    case LazyDict::REP_BYTESOURCE:
+      isHeld = payload.pBytesourceM != nullptr;
+      break;
+  }
+  if (!isHeld) form.repM = kBadRep;
+  return form;
+}
+
 namespace {
 
-const char kUnknownRepForDictionaryG[] = "LazyDict to Dictionary: unknown representation in LazyDict";
+// A duplicate read through this counts what it delivers.
+class CountedSource : public wynbaselib::Bytesource {
+ public:
+  CountedSource(wynbaselib::Bytesource* source, size_t* pCount) : pSourceM(source), pCountM(pCount) {}
+  ~CountedSource() override { delete pSourceM; }
+  size_t Read(void* buffer, size_t size) override {
+    size_t n = pSourceM->Read(buffer, size);
+    *pCountM += n;
+    return n;
+  }
+  Bytesource* Duplicate() override { return nullptr; }
+  bool FError() const override { return pSourceM->FError(); }
+  const char* GetErrorText() const override { return pSourceM->GetErrorText(); }
+
+ private:
+  wynbaselib::Bytesource* pSourceM;
+  size_t* pCountM;
+};
+
+}  // namespace
+
+bool ReadBytesource(const LazyDict& payload, ref<Dictionary>& out, VekString& error, size_t* pBytesRead) {
+  wynbaselib::Bytesource* duplicate = payload.pBytesourceM->Duplicate();
+  if (duplicate == nullptr) {
+    out.Reset();
+    error = VekString::Format(payload.GetMempool(), "%s", kLazyDictNoDuplicateMessage);
+    return false;
+  }
+  if (pBytesRead != nullptr) {
+    CountedSource* counted = new (std::nothrow) CountedSource(duplicate, pBytesRead);
+    if (counted == nullptr) delete duplicate;
+    duplicate = counted;
+  }
+  VekString message;
+  out = Dictionary::FromJsonBytesource(duplicate, message, payload.GetMempool());  // deletes the duplicate
+  if (out && message.FEmpty()) return true;
+  error = message.FEmpty() ? VekString::Format(payload.GetMempool(), "%s", kOutOfMemoryMessage) : message;
+  return false;
+}
+
+ref<Dictionary> JsonToDictionaryOrError(const LazyDict& payload) {
+  VekString error;
+  ref<Dictionary> dictionary = Dictionary::FromJsonBytestring(payload.bytesM, error, payload.GetMempool());
+  return dictionary ? dictionary : MakeErrorDictionary(payload.GetMempool(), error);
+}
+
+ref<Dictionary> TreeOf(const LazyDict& payload, const LazyForm& form, VekString& error, bool isErrorTree) {
+  VekMempool* pool = payload.GetMempool();
+  ref<Dictionary> tree;
+  switch (form.repM) {
+    case LazyDict::REP_DICT:
+      return payload.dictM->GetDictionary();
+    case LazyDict::REP_JSON:
+      if (isErrorTree) return JsonToDictionaryOrError(payload);
+      return Dictionary::FromJsonBytestring(payload.bytesM, error, pool);
+    case LazyDict::REP_PROTOBUF:
+    case LazyDict::REP_OBJECT: {
+      ref<SarnObject> object = form.repM == LazyDict::REP_OBJECT ? form.objectM : ProtobufToObject(payload);
+      if (object) tree = DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG)
+                             .SarnObjectToDictionary(object.Get(), payload.versionM);
+      if (!tree) error = VekString::Format(pool, "%s", kOutOfMemoryMessage);
+      return tree;
+    }
+    case LazyDict::REP_DICTIONARY:
+      return payload.dictionaryM;
+    case LazyDict::REP_BYTESOURCE:
+      if (ReadBytesource(payload, tree, error)) return tree;
+      return isErrorTree ? MakeErrorDictionary(pool, error) : ref<Dictionary>();
+    default:
+      error = VekString::Format(pool, "%s", "LazyDict to Dictionary: unknown representation in LazyDict");
+      return ref<Dictionary>();
+  }
+}
+
+}  // namespace internal
+
+using internal::FormOf;
+using internal::LazyForm;
+using internal::LazyNesting;
+
+namespace {
 
 // Output adaptors, so that the buffer and sink writers share one switch.
 struct BufferTarget {
   ByteBuffer& bufferM;
-  void Raw(const vek::ByteBuffer& bytes) { bufferM.AppendBytes(bytes.GetData(), bytes.GetLength()); }
+  bool Raw(const unsigned char* data, size_t length) { return bufferM.AppendBytes(data, length); }
   void Tree(const Dictionary& dictionary, bool pretty) { dictionary.ToJson(bufferM, JsonFormat(pretty)); }
+  void Object(const LazyDict& payload, const SarnObject* object, bool pretty) {
+    internal::ObjectToJson(payload, object, bufferM, pretty);
+  }
 };
 
 struct SinkTarget {
   wynbaselib::Bytesink& sinkM;
-  void Raw(const vek::ByteBuffer& bytes) {
-    sinkM.Write(reinterpret_cast<const char*>(bytes.GetData()), bytes.GetLength());
+  bool Raw(const unsigned char* data, size_t length) {
+    return sinkM.Write(reinterpret_cast<const char*>(data), length);
   }
   void Tree(const Dictionary& dictionary, bool pretty) { dictionary.ToJson(sinkM, JsonFormat(pretty)); }
+  void Object(const LazyDict& payload, const SarnObject* object, bool pretty) {
+    internal::ObjectToJson(payload, object, sinkM, pretty);
+  }
 };
+
+// The bytes of a fresh duplicate of the source, copied as they come.
+template <class Out>
+void CopySource(wynbaselib::Bytesource* source, Out& out) {
+  wynbaselib::Bytesource* duplicate = source->Duplicate();
+  if (duplicate == nullptr) return;
+  unsigned char block[4096];
+  for (;;) {
+    size_t n = duplicate->Read(block, sizeof block);
+    if (n == 0 || !out.Raw(block, n)) break;
+  }
+  delete duplicate;
+}
 
 bool TypeNameOfDictionary(const Dictionary& dictionary, VekString* name) {
   static const VekString kType("type");
   if (dictionary.CountValues(kType) == 0) return false;
   if (name != nullptr) *name = dictionary.GetString(kType);
   return true;
+}
+
+// The registry's name lookup finds the slot that a scan of the table by name would (names are
+// unique); the slot's index is the id.
+bool TypeIdOfDictionary(const Dictionary& dictionary, unsigned int* typeId) {
+  static const VekString kType("type");
+  VekString name = dictionary.GetString(kType);
+  if (name.FEmpty()) return false;
+  const StructInfo* info = StructInfoMap::LookupStructByName(name.Utf8());
+  if (info == nullptr || std::strlen(info->pName) != name.NByte()) return false;
+  for (int slot = 0; slot < Schema::nStructDefG; ++slot) {
+    if (Schema::vStructDefG[slot] == info) {
+      if (typeId != nullptr) *typeId = static_cast<unsigned int>(slot);
+      return true;
+    }
+  }
+  return false;
 }
 
 }  // namespace
@@ -107,70 +272,122 @@ ref<LazyDict> LazyDict::FromDictionary(VekMempool* pool, const ref<Dictionary>& 
 
 void LazyDict::SetDictionary(const ref<Dictionary>& dictionary) { dictionaryM = dictionary; }
 
+bool LazyDict::GetDictionaryFromBytesource(ref<Dictionary>& out) const {
+  if (repM != REP_BYTESOURCE || pBytesourceM == nullptr) {
+    VekAssertFail("GetDictionaryFromBytesource: repM == REP_BYTESOURCE && pBytesourceM != nullptr", __FILE__);
+  }
+  VekString error;
+  return internal::ReadBytesource(*this, out, error);
+}
+
+void LazyDict::BuildDictionaryFromBytesource() {
+  if (dictionaryM) return;
+  if (!GetDictionaryFromBytesource(dictionaryM)) return;
+  repM = REP_DICTIONARY;
+  delete pBytesourceM;
+  pBytesourceM = nullptr;
+}
+
 bool LazyDict::GetType(unsigned int* typeId) {
-  // This layer does not look type names up in the registry, so no form has an id here.
-  (void)typeId;
-  return false;
+  LazyNesting nesting;
+  LazyForm form = FormOf(*this, nesting);
+  VekString error;
+  switch (form.repM) {
+    case REP_PROTOBUF:
+    case REP_OBJECT: {
+      ref<SarnObject> object = form.repM == REP_OBJECT ? form.objectM : internal::ProtobufToObject(*this);
+      if (!object) return false;
+      if (typeId != nullptr) *typeId = object->GetTypeId();
+      return true;
+    }
+    case REP_BYTESOURCE:
+      BuildDictionaryFromBytesource();
+      return dictionaryM && TypeIdOfDictionary(*dictionaryM, typeId);
+    default: {
+      ref<Dictionary> tree = internal::TreeOf(*this, form, error, false);
+      return tree && TypeIdOfDictionary(*tree, typeId);
+    }
+  }
 }
 
 bool LazyDict::GetTypeName(VekString* name) {
+  LazyNesting nesting;
+  LazyForm form = FormOf(*this, nesting);
   VekString error;
-  ref<Dictionary> dictionary = DictionaryOf(error);
-  return dictionary && TypeNameOfDictionary(*dictionary, name);
-}
-
-ref<Dictionary> LazyDict::DictionaryOf(VekString& error) const {
-  switch (repM) {
-    case REP_DICT:
-      if (dictM) return dictM->GetDictionary();
-      break;
-    case REP_JSON:
-      return Dictionary::FromJsonBytestring(bytesM, error, pMempoolM);
-    case REP_DICTIONARY:
-      if (dictionaryM) return dictionaryM;
-      break;
-    default:
-      // REP_PROTOBUF, REP_OBJECT and REP_BYTESOURCE have no conversion to a tree here: they are
-      // answered as an unknown representation.
-      break;
+  switch (form.repM) {
+    case REP_PROTOBUF:
+    case REP_OBJECT: {
+      ref<SarnObject> object = form.repM == REP_OBJECT ? form.objectM : internal::ProtobufToObject(*this);
+      if (!object) return false;
+      if (name != nullptr) *name = object->GetTypeName();
+      return true;
+    }
+    case REP_BYTESOURCE:
+      BuildDictionaryFromBytesource();
+      return dictionaryM && TypeNameOfDictionary(*dictionaryM, name);
+    default: {
+      ref<Dictionary> tree = internal::TreeOf(*this, form, error, false);
+      return tree && TypeNameOfDictionary(*tree, name);
+    }
   }
-  error = VekString::Format(pMempoolM, "%s", kUnknownRepForDictionaryG);
-  return ref<Dictionary>();
 }
 
-ref<Dictionary> LazyDict::ToDictionary(VekString& error) const { return DictionaryOf(error); }
+ref<Dictionary> LazyDict::ToDictionary(VekString& error) const {
+  LazyNesting nesting;
+  return internal::TreeOf(*this, FormOf(*this, nesting), error, false);
+}
 
 ref<Dict> LazyDict::ToDict() const {
-  if (repM == REP_DICT && dictM) return dictM;
-  if (repM == REP_JSON) {
-    VekString error;
-    ref<Dictionary> dictionary = Dictionary::FromJsonBytestring(bytesM, error, pMempoolM);
-    if (!dictionary) dictionary = MakeErrorDictionary(pMempoolM, error);
-    if (!dictionary) return ref<Dict>();
-    return MempoolNew<Dict>(pMempoolM, dictionary);
-  }
-  if (repM == REP_DICTIONARY && dictionaryM) return MempoolNew<Dict>(pMempoolM, dictionaryM);
-  // Unknown representation, or a form without a conversion to a tree here (protocol-buffer bytes,
-  // an object, a byte source): the error dictionary.
-  ref<Dict> error = Dict::New(pMempoolM, VekString("error"));
-  if (!error || !error->AddString("code", "internalError") || !error->AddString("text", "bad rep in LazyDict")) {
+  LazyNesting nesting;
+  LazyForm form = FormOf(*this, nesting);
+  if (form.repM == REP_DICT) return dictM;
+  VekString error;
+  ref<Dictionary> tree = internal::TreeOf(*this, form, error, true);
+  if (tree) return MempoolNew<Dict>(pMempoolM, tree);
+  if (form.repM != internal::kBadRep) return ref<Dict>();  // out of memory
+  ref<Dict> bad = Dict::New(pMempoolM, VekString("error"));
+  if (!bad || !bad->AddString("code", "internalError") || !bad->AddString("text", "bad rep in LazyDict")) {
     return ref<Dict>();
   }
-  return error;
+  return bad;
 }
 
 template <class Out>
 void LazyDict::WriteJson(Out& out, bool pretty) const {
-  if (repM == REP_JSON && bytesM && !pretty) {
-    out.Raw(*bytesM);
-    return;
-  }
+  LazyNesting nesting;
+  LazyForm form = FormOf(*this, nesting);
   VekString error;
-  ref<Dictionary> dictionary = DictionaryOf(error);
-  if (dictionary) {
-    out.Tree(*dictionary, pretty);
-  } else if (repM == REP_JSON && bytesM) {
-    out.Raw(*bytesM);  // stored text that does not parse is passed on as it is, not lost
+  switch (form.repM) {
+    case REP_JSON:
+      if (!pretty) {
+        out.Raw(bytesM->GetData(), bytesM->GetLength());
+        return;
+      }
+      if (ref<Dictionary> tree = internal::TreeOf(*this, form, error, false)) {
+        out.Tree(*tree, true);
+      } else {
+        out.Raw(bytesM->GetData(), bytesM->GetLength());  // stored text that does not parse goes out as it came
+      }
+      return;
+    case REP_PROTOBUF:
+      if (ref<SarnObject> object = internal::ProtobufToObject(*this)) out.Object(*this, object.Get(), pretty);
+      return;
+    case REP_OBJECT:
+      out.Object(*this, form.objectM.Get(), pretty);
+      return;
+    case REP_BYTESOURCE:
+      if (ref<Dictionary> tree = internal::TreeOf(*this, form, error, false)) {
+        out.Tree(*tree, pretty);
+      } else {
+        CopySource(pBytesourceM, out);  // what the reader refused goes out as it came
+      }
+      return;
+    case REP_DICT:
+    case REP_DICTIONARY:
+      out.Tree(*internal::TreeOf(*this, form, error, false), pretty);
+      return;
+    default:
+      return;
   }
 }
 
@@ -185,7 +402,7 @@ void LazyDict::ToJsonBytesink(wynbaselib::Bytesink& out, bool pretty) const {
 }
 
 ref<vek::ByteBuffer> LazyDict::ToJsonBytestring(bool pretty) const {
-  if (repM == REP_JSON && bytesM && !pretty) return bytesM;
+  if (repM == REP_JSON && bytesM && !pretty && !LazyNesting::IsNextTooDeep()) return bytesM;
   ByteBuffer text(pMempoolM);
   ToJsonByteBuffer(text, pretty);
   if (text.HasFailed()) return ref<vek::ByteBuffer>();
@@ -202,30 +419,6 @@ bool LazyDict::operator==(const LazyDict& other) const {
   ref<Dict> mine = ToDict();
   ref<Dict> theirs = other.ToDict();
   return mine && theirs && *mine == *theirs;
-}
-
-}  // namespace sarn
-
-namespace sarn {
-
-ref<SarnObject> LazyDict::ToSarnObjectOrErrorString(VekString& error) const {
-  if (repM == REP_OBJECT) return objectM;
-  // Only the object form converts to an object; every other form is answered as an unknown
-  // representation.
-  error = VekString::Format(pMempoolM, "%s", "unknown rep in LazyDict");
-  return nullptr;
-}
-
-ref<SarnObject> LazyDict::ToSarnObjectOrError() const {
-  VekString error;
-  ref<SarnObject> object = ToSarnObjectOrErrorString(error);
-  return object ? object : MakeErrorObject(pMempoolM, error);
-}
-
-bool LazyDict::ToSarnObject(ref<SarnObject>& out) const {
-  VekString error;
-  out = ToSarnObjectOrErrorString(error);
-  return static_cast<bool>(out);
 }
 
 }  // namespace sarn

@@ -175,9 +175,13 @@ JsonSarnObject::JsonSarnObject(VekMempool* mempool)
       pStructDefsM(Schema::vStructDefG),
       nStructDefsM(static_cast<uint32_t>(Schema::nStructDefG)),
       nObjectIndexM(0),
-      vObjectTypesM(8, nullptr, 3) {}
+      vObjectTypesM(8, nullptr, 3),
+      pReadStateM(nullptr) {}
 
-JsonSarnObject::~JsonSarnObject() { vObjectTypesM.Destroy(); }
+JsonSarnObject::~JsonSarnObject() {
+  ReleaseReadState();
+  vObjectTypesM.Destroy();
+}
 
 VekString JsonSarnObject::SarnObjectToJson(const SarnObject* object, KernoVersion version) {
   ByteBuffer out(pMempoolM);

@@ -1,6 +1,8 @@
 // The hash function, the bucket sizes and the global name cache.
 #include "sarn/model/SarnHashTable.h"
 
+#include <new>
+
 #include "vek/VekServices.h"
 
 const int SarnHashTableUtil::hashTableSizesG[16] = {
@@ -87,8 +89,12 @@ SarnHashTableDestructor hashTableDestructor;
 const VekString* GetGlobalName(VekMempool* pool, const char* name) {
   VekSpinLockGuard guard(globalNameLockG);
   if (pGlobalNameTableG == nullptr) {
-    pGlobalNamePoolG = new VekMempool("sarn name cache");
-    pGlobalNameTableG = new SarnNameTable(pGlobalNamePoolG);
+    // Without memory for the cache itself every caller gets null, as for a name that cannot be
+    // stored; a later call tries again.
+    if (pGlobalNamePoolG == nullptr) pGlobalNamePoolG = new (std::nothrow) VekMempool("sarn name cache");
+    if (pGlobalNamePoolG == nullptr) return nullptr;
+    pGlobalNameTableG = new (std::nothrow) SarnNameTable(pGlobalNamePoolG);
+    if (pGlobalNameTableG == nullptr) return nullptr;
   }
   VekString* value;
   if (!pGlobalNameTableG->Put(name, value) && value != nullptr) *value = VekString(name);

@@ -47,7 +47,9 @@ bool Stored(bool isStored, VekMempool* pool, VekString& error) {
   return isStored;
 }
 
-const VekString& CachedName(VekMempool* pool, const char* name) { return *GetGlobalName(pool, name); }
+// The shared string of a metadata name; null only when the name cache's own pool runs out, which
+// fails the conversion like any other allocation.
+const VekString* CachedName(VekMempool* pool, const char* name) { return GetGlobalName(pool, name); }
 
 // Per object: the dictionary being filled, and the key and array of the field being visited.
 struct DictionaryFrameData {
@@ -78,8 +80,10 @@ class DictionarySarnObject::Builder {
 
   void BeginObject(Frame& frame, Frame* parent) {
     VekMempool* pool = converterM.pMempoolM;
-    ref<Dictionary> dictionary =
-        Dictionary::New(pool, frame.pInfoM != nullptr ? CachedName(pool, frame.pInfoM->pName) : VekString());
+    const VekString* typeName = frame.pInfoM != nullptr ? CachedName(pool, frame.pInfoM->pName) : nullptr;
+    ref<Dictionary> dictionary;
+    if (frame.pInfoM == nullptr || typeName != nullptr)
+      dictionary = Dictionary::New(pool, typeName != nullptr ? *typeName : VekString());
     frame.dataM.pDictionaryM = dictionary.Get();
     if (!dictionary) {
       wasOutOfMemoryM = true;
@@ -93,8 +97,14 @@ class DictionarySarnObject::Builder {
 
   void BeginField(Frame& frame) {
     VekMempool* pool = converterM.pMempoolM;
-    if (frame.pNameM != nullptr) frame.dataM.pKeyM = &CachedName(pool, frame.pNameM);
     frame.dataM.pArrayM = nullptr;
+    if (frame.pNameM != nullptr) {
+      frame.dataM.pKeyM = CachedName(pool, frame.pNameM);
+      if (frame.dataM.pKeyM == nullptr) {
+        wasOutOfMemoryM = true;
+        return;
+      }
+    }
     if (frame.pFieldM->arity == SARN_ARITY_MULTI && !wasOutOfMemoryM) {
       // The walk reports only fields with a value to add, so the array is never left empty.
       ref<ArrayValue> array = new (pool) ArrayValue();
@@ -184,7 +194,9 @@ ref<DictValue> DictionarySarnObject::MakeValue(const FieldInfo& field, const Sar
     if (text.pStringM != nullptr) {
       value = new (pool) StringValue(*text.pStringM);
     } else if (text.isNameM) {
-      value = new (pool) StringValue(CachedName(pool, text.pBytesM));
+      const VekString* name = CachedName(pool, text.pBytesM);
+      if (name == nullptr) return nullptr;
+      value = new (pool) StringValue(*name);
     } else {
       VekString copy = VekString::FromUtf8Bytes(pool, text.nLengthM, text.pBytesM);
       if (copy.FEmpty() && text.nLengthM != 0) return nullptr;
@@ -232,7 +244,9 @@ bool DictionarySarnObject::DictionaryToSarnObject(const ref<Dictionary>& diction
                               maxDepthM);
     return false;
   }
-  VekString typeName = dictionary->GetString(CachedName(pool, "type"));
+  const VekString* typeKey = CachedName(pool, "type");
+  if (typeKey == nullptr) return Stored(false, pool, error);
+  VekString typeName = dictionary->GetString(*typeKey);
   if (typeName.NByte() == 0) {
     Append(pool, error, "Dictionary has no 'type' field.");
     return false;
@@ -256,7 +270,9 @@ bool DictionarySarnObject::DictionaryToSarnObject(const ref<Dictionary>& diction
     const FieldInfo* field = FieldForVersion(info, n, version);
     if (field == nullptr) continue;
     const char* name = FieldName(info, *field);
-    ref<DictValue> value = dictionary->Get(CachedName(pool, name));
+    const VekString* key = CachedName(pool, name);
+    if (key == nullptr) return Stored(false, pool, error);
+    ref<DictValue> value = dictionary->Get(*key);
     if (value == nullptr) {
       if (version != 0 && field->arity == SARN_ARITY_REQUIRED) {
         Append(pool, error, "Required field not set: ", name);

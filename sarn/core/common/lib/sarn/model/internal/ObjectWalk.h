@@ -24,6 +24,14 @@
 // A descended object is walked completely (BeginObject to EndObject) before the next value of
 // the parent's field.
 //
+// Paired walks (a visitor that declares `static constexpr bool kIsPaired = true`): two objects of
+// one type side by side, the second one kept by the visitor in its frame data (equality). Nothing
+// is skipped for the visitor: every field whose record takes part is offered first to
+//   PairStep PairField(Frame& frame, const FieldInfo& field);
+// which settles the field itself (PAIR_SKIP), asks for its values to be visited (PAIR_VISIT: all
+// of them, null references included, since a null on one side may face a value on the other), or
+// stops the walk (PAIR_STOP, Run returns false). BeginField and EndField are not called.
+//
 // Version policy (the second template argument): CURRENT_RECORDS takes each field's current
 // record, filtered by the version (0: every record whose arity is not NONE); OLDER_RECORDS lets an
 // older record whose range holds the version replace the current one (FieldForVersion).
@@ -48,6 +56,14 @@ enum class WalkVersions : uint8_t {
   CURRENT_RECORDS,
   OLDER_RECORDS,
 };
+
+// A paired visitor's answer for one field (see above).
+enum PairStep : uint8_t { PAIR_SKIP, PAIR_VISIT, PAIR_STOP };
+
+template <class V, class = void>
+struct IsPairedVisitor : std::false_type {};
+template <class V>
+struct IsPairedVisitor<V, std::void_t<decltype(V::kIsPaired)>> : std::bool_constant<V::kIsPaired> {};
 
 template <class Data>
 struct WalkFrame {
@@ -80,6 +96,7 @@ class ObjectWalk {
   using Frame = WalkFrame<Data>;
   using Child = WalkChild<Data>;
   static_assert(std::is_trivially_copyable<Data>::value, "frame data is copied as bytes");
+  static constexpr bool kIsPaired = IsPairedVisitor<Visitor>::value;
 
   ObjectWalk(VekMempool* pool, const StructInfo* const* structDefs, uint32_t nStructDefs)
       : stackM(pool), pStructDefsM(structDefs), nStructDefsM(nStructDefs) {}
@@ -155,28 +172,42 @@ class ObjectWalk {
     visitor.BeginField(frame);
   }
 
-  // Steps through the fields of the top frame: true when a field was started, false when the
-  // object has no field left.
-  bool NextField(Visitor& visitor, Frame& frame) {
+  enum FieldStep { FIELD_STARTED, FIELD_NONE, FIELD_FAILED };
+
+  // Steps through the fields of the top frame to the next one with values to visit.
+  FieldStep NextField(Visitor& visitor, Frame& frame) {
     const StructInfo* info = frame.pInfoM;
-    if (info == nullptr) return false;
+    if (info == nullptr) return FIELD_NONE;
     while (frame.nextFieldM < info->nFieldInfo) {
       unsigned n = frame.nextFieldM++;
       const FieldInfo* field = Select(info, n, frame.versionM);
-      // Codes past the traits table have no values.
-      if (field == nullptr || field->dataType >= kDataTypeCountG) continue;
-      unsigned count = 1;
-      if (field->arity == SARN_ARITY_MULTI) {
-        count = FieldAccess::Count(frame.pObjectM, *field);
-      } else if (field->arity == SARN_ARITY_OPTIONAL && !IsFieldPresent(frame.pObjectM, *field)) {
-        continue;
+      if (field == nullptr) continue;
+      if constexpr (kIsPaired) {
+        PairStep step = visitor.PairField(frame, *field);
+        if (step == PAIR_STOP) return FIELD_FAILED;
+        if (step == PAIR_SKIP) continue;
+        frame.pFieldM = field;
+        frame.nFieldM = n;
+        frame.pNameM = nullptr;
+        frame.nextElementM = 0;
+        frame.nElementM = FieldAccess::Count(frame.pObjectM, *field);
+        return FIELD_STARTED;
+      } else {
+        // Codes past the traits table have no values.
+        if (field->dataType >= kDataTypeCountG) continue;
+        unsigned count = 1;
+        if (field->arity == SARN_ARITY_MULTI) {
+          count = FieldAccess::Count(frame.pObjectM, *field);
+        } else if (field->arity == SARN_ARITY_OPTIONAL && !IsFieldPresent(frame.pObjectM, *field)) {
+          continue;
+        }
+        unsigned first = FirstValue(frame.pObjectM, *field, 0, count);
+        if (first == count) continue;
+        StartField(visitor, frame, field, n, FieldName(info, *field), first, count);
+        return FIELD_STARTED;
       }
-      unsigned first = FirstValue(frame.pObjectM, *field, 0, count);
-      if (first == count) continue;
-      StartField(visitor, frame, field, n, FieldName(info, *field), first, count);
-      return true;
     }
-    return false;
+    return FIELD_NONE;
   }
 
   enum Step { STEP_DESCEND, STEP_DONE, STEP_FAILED };
@@ -186,9 +217,14 @@ class ObjectWalk {
   // objects never leave this loop, so they cost no trip through the stack.
   Step Advance(Visitor& visitor, Frame& frame, Child& child) {
     for (;;) {
-      if (frame.pFieldM == nullptr && (frame.isOneFieldM || !NextField(visitor, frame))) return STEP_DONE;
+      if (frame.pFieldM == nullptr) {
+        if (frame.isOneFieldM) return STEP_DONE;
+        FieldStep next = NextField(visitor, frame);
+        if (next == FIELD_NONE) return STEP_DONE;
+        if (next == FIELD_FAILED) return STEP_FAILED;
+      }
       const FieldInfo& field = *frame.pFieldM;
-      const bool isNullAbsent = TraitsOf(field.dataType).IsNullAbsent();
+      const bool isNullAbsent = !kIsPaired && TraitsOf(field.dataType).IsNullAbsent();
       for (unsigned i = frame.nextElementM; i < frame.nElementM; ++i) {
         if (isNullAbsent && FieldAccess::ReferenceAt(frame.pObjectM, field, i) == nullptr) continue;
         if (!visitor.Value(frame, i, child)) return STEP_FAILED;
@@ -197,7 +233,7 @@ class ObjectWalk {
           return STEP_DESCEND;
         }
       }
-      visitor.EndField(frame);
+      if constexpr (!kIsPaired) visitor.EndField(frame);
       frame.pFieldM = nullptr;
     }
   }

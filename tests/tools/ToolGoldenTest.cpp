@@ -1,0 +1,88 @@
+// Process tests of the command-line programs: each folder under tests/tools/cases/ is one case.
+// Its `cmd` is a shell script run in that folder with the programs first on PATH, standard input
+// from `stdin` (or nothing), and its standard output, standard error and exit status are compared
+// byte for byte with the files `stdout`, `stderr` and `status` (a missing file means empty, or 0).
+// SARN_UPDATE_GOLDEN=1 writes what the programs did into those files instead, for review.
+#include <dirent.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <cctype>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <string>
+#include <vector>
+
+#include "testutil/TestUtil.h"
+
+namespace {
+
+std::string CasesDir() {
+  const char* source = std::getenv("SARN_SOURCE_DIR");
+  return std::string(source != nullptr ? source : ".") + "/tests/tools/cases";
+}
+
+std::vector<std::string> CaseNames() {
+  std::vector<std::string> names;
+  if (DIR* dir = opendir(CasesDir().c_str())) {
+    while (dirent* entry = readdir(dir)) {
+      if (entry->d_name[0] != '.') names.push_back(entry->d_name);
+    }
+    closedir(dir);
+  }
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+std::string ReadOrEmpty(const std::string& path) {
+  std::string text;
+  sarntest::ReadFile(path, text);
+  return text;
+}
+
+// Writes `text` to `path`, or removes the file when the text is the default (empty).
+void WriteGolden(const std::string& path, const std::string& text) {
+  if (text.empty()) {
+    std::remove(path.c_str());
+    return;
+  }
+  std::ofstream(path, std::ios::binary) << text;
+}
+
+class ToolGolden : public ::testing::TestWithParam<std::string> {};
+
+TEST_P(ToolGolden, MatchesGoldenFiles) {
+  const char* toolDir = std::getenv("SARN_TOOL_DIR");
+  if (toolDir == nullptr) GTEST_SKIP() << "the programs are not built (SARN_TOOL_DIR is not set)";
+  std::string dir = CasesDir() + "/" + GetParam();
+  std::string scratch = ::testing::TempDir() + "sarn-golden-" + GetParam();
+  std::string input = dir + "/stdin", unused;
+  if (!sarntest::ReadFile(input, unused)) input = "/dev/null";
+  // The programs' folders first on PATH; SARN_SOURCE_DIR stays set for scripts that use the tree.
+  std::string command = "cd '" + dir + "' && PATH='" + toolDir + "':\"$PATH\" SCRATCH='" + scratch +
+                        "' exec sh ./cmd <'" + input + "' >'" + scratch + ".out' 2>'" + scratch + ".err'";
+  int raw = std::system(command.c_str());
+  ASSERT_TRUE(WIFEXITED(raw)) << "the case's shell did not exit normally";
+  std::string status = std::to_string(WEXITSTATUS(raw)) + "\n";
+  std::string out = ReadOrEmpty(scratch + ".out"), err = ReadOrEmpty(scratch + ".err");
+  if (const char* update = std::getenv("SARN_UPDATE_GOLDEN"); update != nullptr && std::string(update) == "1") {
+    WriteGolden(dir + "/stdout", out);
+    WriteGolden(dir + "/stderr", err);
+    WriteGolden(dir + "/status", status == "0\n" ? "" : status);
+    return;
+  }
+  std::string wantStatus = ReadOrEmpty(dir + "/status");
+  EXPECT_EQ(status, wantStatus.empty() ? "0\n" : wantStatus);
+  EXPECT_EQ(out, ReadOrEmpty(dir + "/stdout")) << "standard output of " << GetParam();
+  EXPECT_EQ(err, ReadOrEmpty(dir + "/stderr")) << "standard error of " << GetParam();
+}
+
+INSTANTIATE_TEST_SUITE_P(Cases, ToolGolden, ::testing::ValuesIn(CaseNames()),
+                         [](const ::testing::TestParamInfo<std::string>& info) {
+                           std::string name = info.param;
+                           for (char& c : name) c = std::isalnum(static_cast<unsigned char>(c)) ? c : '_';
+                           return name;
+                         });
+
+}  // namespace

@@ -1,0 +1,56 @@
+// sarn: the command-line tool over the library, written against its public interface only, as a
+// user's program would be. One command per file; this file dispatches.
+#include <csignal>
+#include <cstdio>
+#include <cstring>
+
+#include "Cli.h"
+
+namespace {
+
+const sarncli::Command* const kCommands[] = {&sarncli::kConvertCommand, &sarncli::kSchemaCommand,
+                                             &sarncli::kValidateCommand};
+
+void PrintHelp() {
+  std::printf(
+      "Usage: sarn COMMAND [OPTION]... [INPUT]...\n"
+      "Reads, writes and checks the messages and objects of the Kerno service.\n\n"
+      "Commands:\n");
+  for (const sarncli::Command* command : kCommands) std::printf("  %-10s %s\n", command->pName, command->pSummary);
+  std::printf(
+      "\n"
+      "Every command takes --help. \"-\" names standard input. Exit status: 0 when every input was\n"
+      "read and is valid, 1 when an input was refused or invalid, 2 for a usage or I/O error.\n"
+      "\n"
+      "Options:\n"
+      "  --help     print this text\n"
+      "  --version  print the versions of the tool, the library and the schema\n");
+}
+
+int UsageError(const char* message, const char* argument) {
+  std::fprintf(stderr, "sarn: %s%s%s\nTry 'sarn --help'.\n", message, argument, *argument != '\0' ? "'" : "");
+  return sarncli::STATUS_USAGE;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  // A closed output pipe shows up as a failed write, which ends the tool quietly (Cli.cpp).
+  std::signal(SIGPIPE, SIG_IGN);
+  if (argc < 2) return UsageError("missing command", "");
+  if (std::strcmp(argv[1], "--help") == 0) return PrintHelp(), 0;
+  if (std::strcmp(argv[1], "--version") == 0) {
+    std::printf("sarn %s\nlibrary %s\nschema versions %d to %d (default %d), %d types, %d enums\n", SARN_TOOL_VERSION,
+                sarn::GetLibraryVersion(), sarn::Schema::firstSchemaVersionG, sarn::Schema::lastSchemaVersionG,
+                sarn::Schema::defaultSchemaVersionG, sarn::Schema::nStructTypeG, sarn::Schema::nEnumTypeG);
+    return 0;
+  }
+  for (const sarncli::Command* command : kCommands) {
+    if (std::strcmp(argv[1], command->pName) != 0) continue;
+    // Each command declares its options and parses them itself.
+    sarncli::Context context(*command, argc - 2, argv + 2);
+    return command->pMain(context);
+  }
+  if (argv[1][0] == '-') return UsageError("unknown option '", argv[1]);
+  return UsageError("unknown command '", argv[1]);
+}
