@@ -145,7 +145,11 @@ int Context::UsageError(const std::string& message) {
 }
 
 void Context::Report(const std::string& input, const std::string& message, int status) {
-  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pName, input.c_str(), message.c_str());
+  // One line per diagnostic: a message that ends in line breaks loses them, and one that spans
+  // lines (the streaming JSON parser's) has them turned into blanks.
+  std::string line = message.substr(0, message.find_last_not_of("\r\n") + 1);
+  for (char& c : line) c = c == '\n' || c == '\r' ? ' ' : c;
+  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pName, input.c_str(), line.c_str());
   Raise(status);
 }
 

@@ -5,7 +5,8 @@
 // - exit status 0 when every input was read and is valid (and for --help), 1 when an input was
 //   refused or invalid, 2 for a usage or I/O error; a later input never lowers the status;
 // - standard output carries results only, byte for byte; every diagnostic is one line on
-//   standard error, "sarn: COMMAND: INPUT: message", the library's texts unchanged; a usage
+//   standard error, "sarn: COMMAND: INPUT: message", the library's texts unchanged (but for
+//   line breaks inside a message, which become blanks); a usage
 //   error adds the line "Try 'sarn COMMAND --help'.";
 // - "-" names standard input;
 // - a closed output pipe ends the tool at once and quietly, with the status reached so far, as
@@ -115,6 +116,8 @@ class Context {
 // The commands, each in a file of its own.
 extern const Command kSchemaCommand;
 extern const Command kConvertCommand;
+extern const Command kDecodeCommand;
+extern const Command kEncodeCommand;
 extern const Command kValidateCommand;
 
 // Names of the data types and arities as the schema tool prints them ("STRING", "optional").

@@ -8,7 +8,8 @@
 
 namespace {
 
-const sarncli::Command* const kCommands[] = {&sarncli::kConvertCommand, &sarncli::kSchemaCommand,
+const sarncli::Command* const kCommands[] = {&sarncli::kConvertCommand, &sarncli::kDecodeCommand,
+                                             &sarncli::kEncodeCommand,  &sarncli::kSchemaCommand,
                                              &sarncli::kValidateCommand};
 
 void PrintHelp() {
