@@ -90,10 +90,13 @@ class Context {
 
   // Opens the output named by -o; false after reporting an I/O error.
   bool OpenOutput();
-  // Writes a result; a closed pipe ends the process quietly with the status so far.
+  // Writes a result. Results are collected in a buffer of 64 KiB, written when it is full, before
+  // each diagnostic (so that the two streams keep their order on a terminal) and by Finish; a
+  // closed pipe ends the process quietly with the status so far.
   void Write(const char* data, size_t size);
   void Write(const std::string& text) { Write(text.data(), text.size()); }
-  Output& GetOutput() { return outputM; }
+  // Writes what is buffered; returns the status.
+  int Finish();
 
   // Reads a whole input ("-": standard input) of at most `limit` bytes; false after reporting
   // the failure (an I/O error, status 2; an input past the limit, status 1).
@@ -111,6 +114,9 @@ class Context {
   std::vector<std::pair<std::string, std::string>> givenM;
   int statusM;
   Output outputM;
+  std::string bufferM;
+  static constexpr size_t kBufferBytes = 65536;
+  void WriteNow(const char* data, size_t size);
 };
 
 // The commands, each in a file of its own.
