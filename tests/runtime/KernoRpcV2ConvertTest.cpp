@@ -18,10 +18,19 @@ std::string Summary(VekMempool* pool, const ref<KernoRpcWrapper>& w) {
   return Str(w->ToString(pool)) + " v" + std::to_string(w->schemaVersionM) + (body ? "/" + std::to_string(body->versionM) : "");
 }
 
+// The wrappers' own operator== for two of one kind.
+bool SameWrapper(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
+  auto *ra = dynamic_cast<RequestWrapper*>(a.Get()), *rb = dynamic_cast<RequestWrapper*>(b.Get());
+  auto *sa = dynamic_cast<ResponseWrapper*>(a.Get()), *sb = dynamic_cast<ResponseWrapper*>(b.Get());
+  auto *ca = dynamic_cast<CancelWrapper*>(a.Get()), *cb = dynamic_cast<CancelWrapper*>(b.Get());
+  return (ra && rb && *ra == *rb) || (sa && sb && *sa == *sb) || (ca && cb && *ca == *cb);
+}
+
 }  // namespace
 
 // Rows: an envelope as JSON (its body at version 33) => the wrapper it gives => the envelope that
-// wrapper gives, as the text of ToString ("-": none).
+// wrapper gives, as the text of ToString ("-": none), which must come through the binary form equal
+// and give back a wrapper equal to the first.
 TEST(KernoRpcV2Convert, EnvelopesAndWrappersBothWays) {
   VekMempool pool("convert");
   for (const auto& row : sarntest::ReadTable("rpc/version-conversion.txt", 3)) {
@@ -32,8 +41,7 @@ TEST(KernoRpcV2Convert, EnvelopesAndWrappersBothWays) {
     EXPECT_EQ(Summary(&pool, wrapper), row[1]) << row[0];
     ref<SarnObject> back = KernoRpcV2::KernoRpcV2ToV1(&pool, wrapper);
     EXPECT_EQ(back ? Str(back->ToString(false, 0)) : "-", row[2]) << row[0];
-    EXPECT_TRUE(!back || (*BinaryCopy(&pool, back.Get()) == *back &&
-                          *KernoRpcV2::KernoRpcV2ToV1(&pool, KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, back)) == *back)) << row[0];
+    EXPECT_TRUE(!back || (*BinaryCopy(&pool, back.Get()) == *back && SameWrapper(KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, back), wrapper))) << row[0];
   }
   const FieldInfo* f;
   ref<KernoRpcWrapper> bad = KernoRpcV2::KernoRpcV1ToV2Wrapper(&pool, Side(&pool, "kernoRpcRequest.request", "json:{\"type\": ", f));
