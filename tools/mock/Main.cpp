@@ -79,15 +79,15 @@ int main(int argc, char** argv) {
       if (!value(1, 1000000, exitAfter)) return Usage("--exit-after takes a number from 1 to 1000000");
     } else if (option == "--timeout") {
       if (!value(1, 86400, timeout)) return Usage("--timeout takes a number of seconds from 1 to 86400");
-      settings.idleTimeoutSeconds = static_cast<int>(timeout);
+      settings.idleTimeoutSecondsM = static_cast<int>(timeout);
     } else {
       return Usage("unknown option or missing value '" + option + "'");
     }
   }
   if (responses.empty()) return Usage("--responses DIR is required");
   std::string error;
-  if (!settings.table.Load(responses, error)) return std::fprintf(stderr, "sarn-mock: %s\n", error.c_str()), 2;
-  if (!settings.log.Open(logPath, isTimestamps)) {
+  if (!settings.tableM.Load(responses, error)) return std::fprintf(stderr, "sarn-mock: %s\n", error.c_str()), 2;
+  if (!settings.logM.Open(logPath, isTimestamps)) {
     return std::fprintf(stderr, "sarn-mock: %s: %s\n", logPath.c_str(), std::strerror(errno)), 2;
   }
   if (isStdio) {
@@ -119,7 +119,7 @@ int main(int argc, char** argv) {
     if (fd < 0) continue;
     unsigned connection = ++connections;
     if (active.load() >= sarnmock::kMaxConnections) {
-      settings.log.Line(connection, "error", "too many connections (16 at once): refused");
+      settings.logM.Line(connection, "error", "too many connections (16 at once): refused");
       close(fd);
       continue;
     }

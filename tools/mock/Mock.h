@@ -48,9 +48,9 @@ class Log {
 };
 
 struct Settings {
-  CannedTable table;
-  Log log;
-  int idleTimeoutSeconds = 30;
+  CannedTable tableM;
+  Log logM;
+  int idleTimeoutSecondsM = 30;
 };
 
 // Serves one connection (or the --stdio session) until the peer closes it, sends a frame that

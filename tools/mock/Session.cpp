@@ -26,10 +26,10 @@ class Session {
       : settingsM(settings), connectionM(connection), inFdM(inFd), outFdM(outFd), poolM("connection") {}
 
   void Run() {
-    settingsM.log.Line(connectionM, "open");
+    settingsM.logM.Line(connectionM, "open");
     size_t length;
     while (NextFrame(length) && Answer(length)) pendingM.erase(0, length);
-    settingsM.log.Line(connectionM, "close");
+    settingsM.logM.Line(connectionM, "close");
   }
 
  private:
@@ -48,9 +48,9 @@ class Session {
         if (pendingM.size() >= length) return true;
       }
       pollfd wait = {inFdM, POLLIN, 0};
-      int ready = poll(&wait, 1, settingsM.idleTimeoutSeconds * 1000);
+      int ready = poll(&wait, 1, settingsM.idleTimeoutSecondsM * 1000);
       if (ready < 0 && errno == EINTR) continue;
-      if (ready == 0) return Error("idle for more than " + std::to_string(settingsM.idleTimeoutSeconds) + " s");
+      if (ready == 0) return Error("idle for more than " + std::to_string(settingsM.idleTimeoutSecondsM) + " s");
       char block[65536];
       size_t want = packetizer.decidedM ? length - pendingM.size() : 64;
       ssize_t n = read(inFdM, block, want < sizeof block ? want : sizeof block);
@@ -61,7 +61,7 @@ class Session {
   }
 
   bool Error(const std::string& message) {
-    settingsM.log.Line(connectionM, "error", message);
+    settingsM.logM.Line(connectionM, "error", message);
     return false;
   }
 
@@ -74,13 +74,13 @@ class Session {
     ref<sarn::KernoRpcWrapper> message = sarn::KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(
         &poolM, source, sarn::KernoRpcV2BytestreamImpl::LazyUnparsed, error);
     if (!message) return Error(error.Utf8());
-    settingsM.log.Line(connectionM, "in", Text(message->ToString(&poolM)));
+    settingsM.logM.Line(connectionM, "in", Text(message->ToString(&poolM)));
     auto* request = dynamic_cast<sarn::RequestWrapper*>(message.Get());
     // Cancels, request updates and responses are logged, not answered.
     if (request == nullptr || dynamic_cast<sarn::RequestUpdateWrapper*>(request) != nullptr) return true;
     if (request->responseCountM == sarn::RequestWrapper::ResponseCountNone) return true;
     std::string type = Text(request->requestTypeM);
-    const std::vector<std::string>* bodies = settingsM.table.Find(type);
+    const std::vector<std::string>* bodies = settingsM.tableM.Find(type);
     if (bodies == nullptr) return Send(request, NoCannedResponse(type), true);
     size_t count = request->responseCountM == sarn::RequestWrapper::ResponseCountSingle ? 1 : bodies->size();
     for (size_t i = 0; i < count; ++i) {
@@ -114,7 +114,7 @@ class Session {
     VekString error;
     ref<sarn::KernoRpcWrapper> wrapper = response;
     if (!sarn::KernoRpcV2::MarshalToString(wrapper, frame, error, &poolM, false)) return Error(error.Utf8());
-    settingsM.log.Line(connectionM, "out", Text(response->ToString(&poolM)));
+    settingsM.logM.Line(connectionM, "out", Text(response->ToString(&poolM)));
     return WriteAll(outFdM, reinterpret_cast<const char*>(frame.GetData()), frame.GetLength()) ||
            Error("the peer stopped reading");
   }

@@ -62,7 +62,7 @@ bool Context::Parse() {
       continue;
     }
     if (argument == "--help") {
-      std::fputs(commandM.pHelp, stdout);
+      std::fputs(commandM.pHelpM, stdout);
       std::fflush(stdout);
       isHelpM = true;
       return true;
@@ -139,7 +139,7 @@ bool Context::Choice(const char* name, const std::vector<const char*>& choices, 
 }
 
 int Context::UsageError(const std::string& message) {
-  std::fprintf(stderr, "sarn: %s: %s\nTry 'sarn %s --help'.\n", commandM.pName, message.c_str(), commandM.pName);
+  std::fprintf(stderr, "sarn: %s: %s\nTry 'sarn %s --help'.\n", commandM.pNameM, message.c_str(), commandM.pNameM);
   Raise(STATUS_USAGE);
   return STATUS_USAGE;
 }
@@ -150,7 +150,7 @@ void Context::Report(const std::string& input, const std::string& message, int s
   // lines (the streaming JSON parser's) has them turned into blanks.
   std::string line = message.substr(0, message.find_last_not_of("\r\n") + 1);
   for (char& c : line) c = c == '\n' || c == '\r' ? ' ' : c;
-  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pName, input.c_str(), line.c_str());
+  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pNameM, input.c_str(), line.c_str());
   Raise(status);
 }
 

@@ -50,10 +50,10 @@ typedef int (*CommandMain)(Context& context);
 
 // One command of the tool: its name, the text --help prints, and its body.
 struct Command {
-  const char* pName;
-  const char* pSummary;  // one line for `sarn --help`
-  const char* pHelp;     // the whole text of `sarn NAME --help`
-  CommandMain pMain;
+  const char* pNameM;
+  const char* pSummaryM;  // one line for `sarn --help`
+  const char* pHelpM;     // the whole text of `sarn NAME --help`
+  CommandMain pMainM;
 };
 
 // The state of one command's run: its parsed arguments, its status, its output.

@@ -60,10 +60,10 @@ class InputStream {
 };
 
 struct Settings {
-  sarn::KernoRpcV2BytestreamImpl::LazinessSettings laziness;
-  bool isUntyped;
-  bool isCompact;
-  sarn::KernoVersion fallbackVersion;
+  sarn::KernoRpcV2BytestreamImpl::LazinessSettings lazinessM;
+  bool isUntypedM;
+  bool isCompactM;
+  sarn::KernoVersion fallbackVersionM;
 };
 
 // The body of a request or response wrapper; null for a cancel.
@@ -81,8 +81,8 @@ bool PrintMessage(Context& context, VekMempool* pool, const std::string& label, 
   bool isConverted = true;
   if (body) {
     ref<sarn::Dict> bodyDict;
-    if (!settings.isUntyped) {
-      if (body->versionM == 0) body->versionM = settings.fallbackVersion;
+    if (!settings.isUntypedM) {
+      if (body->versionM == 0) body->versionM = settings.fallbackVersionM;
       sarn::KernoVersion version = body->versionM;
       VekString error;
       ref<sarn::SarnObject> object = body->ToSarnObjectOrErrorString(error);
@@ -101,7 +101,7 @@ bool PrintMessage(Context& context, VekMempool* pool, const std::string& label, 
     if (!bodyDict) bodyDict = message->BodyToDict();
     if (bodyDict) dict->AddDict("body", bodyDict);
   }
-  VekString text = dict->ToString(!settings.isCompact);
+  VekString text = dict->ToString(!settings.isCompactM);
   context.Write(text.Utf8(), text.NByte());
   context.Write("\n", 1);
   return isConverted;
@@ -160,7 +160,7 @@ int Main(Context& context) {
       wynbaselib::InMemoryBytestream source(pending.data(), length);
       VekString error;
       ref<sarn::KernoRpcWrapper> message =
-          sarn::KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(&pool, source, settings.laziness, error);
+          sarn::KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(&pool, source, settings.lazinessM, error);
       if (!message) {
         context.Report(label, error.Utf8(), STATUS_INVALID);
       } else {

@@ -19,7 +19,7 @@ void PrintHelp() {
       "Usage: sarn COMMAND [OPTION]... [INPUT]...\n"
       "Reads, writes and checks the messages and objects of the Kerno service.\n\n"
       "Commands:\n");
-  for (const sarncli::Command* command : kCommands) std::printf("  %-10s %s\n", command->pName, command->pSummary);
+  for (const sarncli::Command* command : kCommands) std::printf("  %-10s %s\n", command->pNameM, command->pSummaryM);
   std::printf(
       "\n"
       "Every command takes --help. \"-\" names standard input. Exit status: 0 when every input was\n"
@@ -55,10 +55,10 @@ int main(int argc, char** argv) {
     return 0;
   }
   for (const sarncli::Command* command : kCommands) {
-    if (std::strcmp(argv[1], command->pName) != 0) continue;
+    if (std::strcmp(argv[1], command->pNameM) != 0) continue;
     // Each command declares its options and parses them itself.
     sarncli::Context context(*command, argc - 2, argv + 2);
-    int status = command->pMain(context);
+    int status = command->pMainM(context);
     return context.Finish() > status ? context.GetStatus() : status;
   }
   if (argv[1][0] == '-') return UsageError("unknown option '", argv[1]);
