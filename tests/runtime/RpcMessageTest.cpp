@@ -210,6 +210,7 @@ TEST_F(RpcMessageTest, WritersAndRoundTrips) {
 
 TEST_F(RpcMessageTest, Readers) {
   // frame => string reader => byte-source reader in settings 0, 1, 2 ("=": as the field before)
+  EXPECT_EQ(ReadText(1, Frame("RpcId: 1\r\nType: response\r\n\r\n##{\"a\": }")), "error Cannot convert JSON to Dict: Empty scalar value for Object field a Failed to parse value for key a");
   for (const auto& row : sarntest::ReadTable("rpc/readers.txt", 5)) {
     const std::string frame = Frame(row[0]);
     std::string expected = row[1];
