@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
-# The main job: sets up a fresh machine, builds the library and runs the demonstration program.
+# The main job: sets up a fresh machine, builds everything (library, tools, examples) and decodes
+# the sample capture with the sarn tool. Extra arguments go to `sarn decode` (e.g. --untyped).
 set -euo pipefail
 top=$(cd "$(dirname "$0")/.." && pwd)
 "$top/scripts/setup.sh"
-"$top/scripts/build.sh" "$top/build" -DSARN_BUILD_EXAMPLES=ON
-"$top/build/examples/sarn_demo" "$@"
+"$top/scripts/build.sh" "$top/build" -DSARN_BUILD_EXAMPLES=ON -DSARN_BUILD_TOOLS=ON
+"$top/build/bin/sarn" decode "$@" "$top/examples/data/session.mrpc"

@@ -4,6 +4,7 @@
 // objects of every type written, read and written again.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 
@@ -17,32 +18,21 @@ using namespace sarn;
 using sarntest::PieceSource;
 using sarntest::Str;
 
-std::string Join(const ref<Dictionary>& dictionary) {
-  if (!dictionary) return "unparsable expectation";
-  std::string out;
-  VekStringArray names(nullptr);
-  dictionary->GetSortedNames(names);
-  for (int i = 0; i < names.Count(); ++i) {
-    ref<DictValue> value = dictionary->Get(names[i]);
-    out += Str(names[i]) + "=" + (value->kindM == DictValue::KIND_NULL ? "absent" : Str(value->ToJson(false))) + " ";
-  }
-  return out;
-}
-
 class JsonReadTest : public sarntest::PoolTest {
  protected:
-  // "! message" for a refusal (the result must then be null), else the written object.
+  // "!" and the message for a refusal (the result must then be null), else the written object.
   std::string Outcome(bool isOk, const ref<SarnObject>& object, const VekString& error) {
-    if (!isOk) return std::string(object ? "result kept: " : "! ") + Str(error);
+    if (!isOk) return (object ? "result kept: " : "!") + Str(error);
     return Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0));
   }
-  std::string Memory(const std::string& text, KernoVersion version = 0) {
+  std::string Memory(const std::string& text, KernoVersion version = 0, int length = -2) {
     ref<SarnObject> object = sarnschema::Success::Factory(&poolM);  // a stale result must be cleared
     VekString error;
     bool isOk = readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                         static_cast<int>(text.size()), version, &object, error);
+                                         length == -2 ? static_cast<int>(text.size()) : length, version, &object, error);
     return Outcome(isOk, object, error);
   }
+  // Also checks that both duplicates are deleted, the source is not moved, and bytesRead.
   std::string Source(const std::string& text, size_t piece) {
     PieceSource::Counters counters;
     PieceSource source(std::make_shared<const std::string>(text), piece, &counters);
@@ -50,71 +40,46 @@ class JsonReadTest : public sarntest::PoolTest {
     VekString error;
     size_t bytesRead = 0;
     bool isOk = readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error);
-    EXPECT_EQ(counters.nDuplicatedM, 2);
-    EXPECT_EQ(counters.nDeletedM, 2);
-    EXPECT_EQ(source.Position(), 0u);
-    if (isOk && text.back() == '}') {
-      EXPECT_EQ(bytesRead, text.size()) << piece;
-    }
+    EXPECT_EQ(std::to_string(counters.nDuplicatedM) + std::to_string(counters.nDeletedM) + std::to_string(source.Position()), "220");
+    EXPECT_TRUE(!isOk || text.back() != '}' || bytesRead == text.size()) << bytesRead;
     return Outcome(isOk, object, error);
   }
-  // The members of the written object that `expected` names, as "name=json" (absent for null).
-  std::string Project(const std::string& written, const std::string& expected) {
+  // The members of `text` that `names` names, as "name=compact json" ("absent" for none or null).
+  std::string Pick(const std::string& text, const std::string& names) {
     VekString error;
-    ref<Dictionary> want = Dictionary::FromJson(VekString(expected.c_str()), error, &poolM);
-    ref<Dictionary> got = Dictionary::FromJson(VekString(written.c_str()), error, &poolM);
-    if (!want || !got) return "unparsable: " + written;
-    ref<Dictionary> picked = Dictionary::New(&poolM, VekString());
-    VekStringArray names(nullptr);
-    want->GetSortedNames(names);
-    for (int i = 0; i < names.Count(); ++i) {
-      ref<DictValue> value = got->Get(names[i]);
-      picked->Add(names[i], value ? value : ref<DictValue>(new (&poolM) NullValue()));
+    ref<Dictionary> from = Dictionary::FromJson(VekString(text.c_str()), error, &poolM);
+    ref<Dictionary> want = Dictionary::FromJson(VekString(names.c_str()), error, &poolM);
+    if (!from || !want) return "unparsable: " + text;
+    VekStringArray list(nullptr);
+    want->GetSortedNames(list);
+    std::string out;
+    for (int i = 0; i < list.Count(); ++i) {
+      ref<DictValue> value = from->Get(list[i]);
+      bool isAbsent = !value || value->kindM == DictValue::KIND_NULL;
+      out += Str(list[i]) + "=" + (isAbsent ? "absent" : Str(value->ToJson(false))) + " ";
     }
-    return Join(picked);
-  }
-  ref<Dictionary> Parse(const std::string& text) {
-    VekString error;
-    return Dictionary::FromJson(VekString(text.c_str()), error, &poolM);
+    return out;
   }
 
   JsonSarnObject readerM{&poolM};
 };
 
 TEST_F(JsonReadTest, TableOfTextsAgreesThroughEveryEntryPoint) {
+  // One converter reads every row; a refusal's message is joined from the inside out.
   for (const auto& row : sarntest::ReadTable("json/object-reads.txt", 2)) {
-    const std::string& text = row[0];
-    std::string got = Memory(text);
-    for (size_t piece : {1, 7, 16384}) EXPECT_EQ(Source(text, piece), got) << text << " in pieces of " << piece;
-    if (row[1][0] == '!') {
-      EXPECT_EQ(got, row[1]) << text;
-    } else {
-      EXPECT_EQ(Project(got, row[1]), Join(Parse(row[1]))) << text << "\n  wrote " << got;
-    }
+    std::string got = Memory(row[0]);
+    for (size_t piece : {1, 7, 16384}) EXPECT_EQ(Source(row[0], piece), got) << row[0] << " in pieces of " << piece;
+    EXPECT_EQ(row[1][0] == '!' ? got : Pick(got, row[1]), row[1][0] == '!' ? row[1] : Pick(row[1], row[1])) << row[0];
   }
-}
-
-TEST_F(JsonReadTest, MissingTypeLeavesErrorUntouchedAndVersionRestrictsNothing) {
-  for (const char* text : {"{}", "{\"type\": \"nothing\", \"a\": 1}", "{\"inner\": {\"type\": \"success\"}}"}) {
-    ref<SarnObject> object = sarnschema::Success::Factory(&poolM);
-    VekString error("before");
-    EXPECT_FALSE(readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text), static_cast<int>(strlen(text)),
-                                          0, &object, error));
-    EXPECT_EQ(Str(error), "before");
-    EXPECT_FALSE(object);
-  }
-  // isVisible is carried from version 9 on; a read at version 7 still takes it.
+  // The version restricts nothing (isVisible is carried from version 9 on); entry-point refusals.
   EXPECT_EQ(Memory("{\"type\": \"syncDeltaInternal\", \"isVisible\": true}", 7),
             "{\"type\": \"syncDeltaInternal\", \"isVisible\": true}");
-  EXPECT_EQ(Memory("{}", 0), "! ");
-  VekString error;
-  EXPECT_FALSE(readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>("{}"), -1, 0, nullptr, error));
-  EXPECT_EQ(Str(error), "Negative JSON length.");
+  EXPECT_EQ(Memory("{}", 0, -1), "!Negative JSON length.");
   sarntest::TestSource undup({"{}"});
+  VekString error;
   size_t bytesRead = 0;
   EXPECT_FALSE(readerM.JsonToSarnObject(&undup, bytesRead, 0, nullptr, error));
-  EXPECT_EQ(Str(error), "Negative JSON length.Byte source cannot be duplicated.");
-  EXPECT_EQ(undup.nReadM, 0);
+  EXPECT_EQ(Str(error) + std::to_string(undup.nReadM), "Byte source cannot be duplicated.0");
 }
 
 TEST_F(JsonReadTest, FreeFormReaderThroughItsOwnEntry) {
@@ -132,9 +97,7 @@ TEST_F(JsonReadTest, FreeFormReaderThroughItsOwnEntry) {
 }
 
 // The bytes a captured member's source gives, read from a duplicate.
-std::string Captured(const SarnObject* object) {
-  const auto* request = static_cast<const sarnschema::KernoRpcRequest*>(object);
-  const LazyDict* lazy = request->requestM.Get();
+std::string Captured(const LazyDict* lazy) {
   if (lazy == nullptr || lazy->repM != LazyDict::REP_BYTESOURCE || lazy->versionM != 0) return "no capture";
   std::unique_ptr<wynbaselib::Bytesource> copy(lazy->pBytesourceM->Duplicate());
   std::string out;
@@ -149,18 +112,19 @@ TEST_F(JsonReadTest, LazyMembersKeepTheirExactBytesAcrossBlockBoundaries) {
     std::string head = "{\"type\": \"kernoRpcRequest\", \"rpcId\": 4, \"pad\": \"";
     head += std::string(16384 + shift - head.size() - 16, 'p') + "\",  \"request\":  ";
     std::string text = head + member + " , \"kernoVersion\": 9}";
-    ASSERT_EQ(head.size(), 16384u + shift);
-    ref<SarnObject> object;
-    VekString error;
-    ASSERT_TRUE(readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                         static_cast<int>(text.size()), 0, &object, error));
-    EXPECT_EQ(Captured(object.Get()), member) << shift;
-    for (size_t piece : {7, 16384}) {
+    for (size_t piece : {0, 7, 16384}) {  // 0: from memory
       PieceSource source(std::make_shared<const std::string>(text), piece);
+      ref<SarnObject> object;
+      VekString error;
       size_t bytesRead;
-      ASSERT_TRUE(readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error));
-      EXPECT_EQ(Captured(object.Get()), member) << shift << " " << piece;
-      EXPECT_EQ(static_cast<sarnschema::KernoRpcRequest*>(object.Get())->kernoVersionM, 9);
+      ASSERT_TRUE(piece == 0 ? readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
+                                                        static_cast<int>(text.size()), 0, &object, error)
+                             : readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error));
+      auto* request = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
+      // The trailing comma keeps the streaming parser from reading it: written again unchanged.
+      const LazyDict* lazy = request->requestM.Get();
+      EXPECT_EQ(Captured(lazy) + Str(lazy->ToJson(false)) + Str(lazy->ToJson(true)) +
+                    std::to_string(request->kernoVersionM), member + member + member + "9") << shift;
     }
   }
 }
@@ -170,15 +134,14 @@ TEST_F(JsonReadTest, ArraysOfLazyMembersAndAnEchoAlreadyRunning) {
   struct LazyList : SarnObject {
     LazyList() : SarnObject(543), itemsM(nullptr) {}
     VekGenericArray itemsM;
-  };
-  LazyList probe;
+  } probe;
   const auto offset = reinterpret_cast<char*>(&probe.itemsM) - reinterpret_cast<char*>(static_cast<SarnObject*>(&probe));
-  const FieldInfo kField = {7, 42, {MakeTypeBits(SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY, SARN_ARITY_MULTI, 0)},
-                            static_cast<uint16_t>(offset), 0, 0, 0};
-  const StructInfo kList = {"success", nullptr, 1, &kField, nullptr, "items",
-                                   [](VekMempool* pool) { return ref<SarnObject>(new (pool) LazyList()); }};
+  const FieldInfo field = {7, 42, {MakeTypeBits(SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY, SARN_ARITY_MULTI, 0)},
+                           static_cast<uint16_t>(offset), 0, 0, 0};
+  const StructInfo list = {"success", nullptr, 1, &field, nullptr, "items",
+                           [](VekMempool* pool) { return ref<SarnObject>(new (pool) LazyList()); }};
   std::vector<const StructInfo*> defs(Schema::vStructDefG, Schema::vStructDefG + Schema::nStructDefG);
-  defs[543] = &kList;
+  defs[543] = &list;
   readerM.pStructDefsM = defs.data();
   const std::string text = "{\"type\": \"testAllTypes\", \"struct\": {\"items\": [ {\"a\":1} ,{ }, {\"b\":[{}]} ]}}";
   InputPointerBytesource first(reinterpret_cast<const unsigned char*>(text.data()), text.size());
@@ -189,16 +152,15 @@ TEST_F(JsonReadTest, ArraysOfLazyMembersAndAnEchoAlreadyRunning) {
   VekString error;
   ASSERT_TRUE(readerM.JsonToSarnObject(first, second, 0, &object, error)) << Str(error);
   second.StopEcho();
-  EXPECT_EQ(outer.textM, text);
-  auto* list = static_cast<LazyList*>(static_cast<sarnschema::TestAllTypes*>(object.Get())->structM.Get());
-  ASSERT_EQ(list->itemsM.Count(), 3);
-  std::string got;
-  for (int i = 0; i < 3; ++i) {
-    std::unique_ptr<wynbaselib::Bytesource> copy(static_cast<LazyDict*>(list->itemsM.Get(i))->pBytesourceM->Duplicate());
-    char buffer[64];
-    got += std::string(buffer, copy->Read(buffer, sizeof buffer)) + "|";
+  auto* items = &static_cast<LazyList*>(static_cast<sarnschema::TestAllTypes*>(object.Get())->structM.Get())->itemsM;
+  std::string got = outer.textM + "|" + std::to_string(items->Count());
+  for (int i = 0; i < items->Count(); ++i) {
+    const auto* lazy = static_cast<LazyDict*>(items->Get(i));
+    got += "|" + Captured(lazy) + " " + Str(lazy->ToJson(false)) + " " + Str(lazy->ToJson(true));
   }
-  EXPECT_EQ(got, "{\"a\":1}|{ }|{\"b\":[{}]}|");
+  // Written again: compact and pretty through the streaming parser's Dictionary.
+  EXPECT_EQ(got, text + "|3|{\"a\":1} {\"a\": 1} {\n    \"a\": 1\n}|{ } {} {\n}|{\"b\":[{}]} {\"b\": [{}]} "
+                        "{\n    \"b\": [\n        {\n        }\n    ]\n}");
 }
 
 // A text whose containers nest `levels` deep (the top object is the first): objects, arrays or
@@ -227,7 +189,7 @@ TEST_F(JsonReadTest, DepthAtTheLimitIsReadAndOneMoreIsRefusedByAllReaders) {
       EXPECT_FALSE(Dictionary::FromJson(VekString(deep.c_str()), error, &poolM)) << style;
       EXPECT_EQ(Memory(fits).substr(0, 1), "{") << style;
       std::string refused = Memory(deep);
-      EXPECT_EQ(refused.substr(0, 2 + message.size()), "! " + message) << style << refused;
+      EXPECT_EQ(refused.substr(0, 1 + message.size()), "!" + message) << style << refused;
     }
   });
 }
@@ -241,37 +203,35 @@ TEST_F(JsonReadTest, ObjectAndElementCountsAtThePlatformLimit) {
   std::string read = Memory(objects(65535));
   EXPECT_EQ(read.substr(0, 1), "{");
   EXPECT_EQ(Memory(objects(65536)),
-            "! JSON text holds more than 65535 objects. failed to UnmarshalOneMultiValue in AVReadFieldValue Failed to "
+            "!JSON text holds more than 65535 objects. failed to UnmarshalOneMultiValue in AVReadFieldValue Failed to "
             "parse an array member. Failed to parse value for key knownDictMulti");
   std::string ints = "{\"type\": \"testAllTypes\", \"intMulti\": [0";
   for (int i = 1; i < 65535; ++i) ints += ",1";
   EXPECT_EQ(Memory(ints + "]}").substr(0, 1), "{");
   EXPECT_EQ(Memory(ints + ",2]}"),
-            "! JSON array holds more than 65535 elements. failed to UnmarshalOneMultiValue in AVReadFieldValue Failed "
+            "!JSON array holds more than 65535 elements. failed to UnmarshalOneMultiValue in AVReadFieldValue Failed "
             "to parse an array member. Failed to parse value for key intMulti");
 }
 
-bool HasLazyField(const StructInfo* info) {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    if (info->vFieldInfo[n].dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) return true;
-  }
-  return false;
-}
-
 TEST_F(JsonReadTest, RandomObjectsOfEveryTypeReadBackAsWritten) {
-  // An empty free-form dictionary is written as {}, which the free-form reader refuses: such
-  // texts must be refused, every other one read back to the same text.
+  // An empty free-form dictionary is written as {}, which the free-form reader refuses: such texts
+  // must be refused. A lazy member is written again from its captured text (through a Dictionary,
+  // so with its members sorted): texts of types with lazy fields must be stable after one read.
   sarntest::RandomObjects random(&poolM, 14, {543, 1259}, 3);
   int nSame = 0;
   for (unsigned round = 0; round < 300; ++round) {
     unsigned typeId = round % 3 == 0 ? 1259 : static_cast<unsigned>(1 + random.Next(1271));
     ref<SarnObject> object = random.Make(typeId);
-    if (!object || HasLazyField(object->GetStructInfo())) continue;
+    if (!object) continue;
     std::string text = Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0));
     std::string again = Memory(text);
     if (text.find("{}") != std::string::npos && again[0] == '!') continue;
-    EXPECT_EQ(again, text) << "type " << typeId;
-    ++nSame;
+    const StructInfo* info = object->GetStructInfo();
+    bool isLazy = std::any_of(info->vFieldInfo, info->vFieldInfo + info->nFieldInfo, [](const FieldInfo& field) {
+      return field.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
+    });
+    EXPECT_EQ(isLazy ? Memory(again) : again, isLazy ? again : text) << "type " << typeId;
+    nSame += !isLazy;
   }
   EXPECT_GT(nSame, 30);
 }

@@ -1,57 +1,82 @@
-// Helpers shared by the equality, copy and version-conversion tests: objects from JSON text, and
-// copies of an object through its JSON and binary forms.
+// Helpers shared by the equality, copy and version-conversion tests: objects from JSON text or
+// from one field's value in a table, a copy through the binary form, and type queries.
 #pragma once
 
-#include <cstring>
+#include <sstream>
 #include <string>
 
 #include "sarn/Sarn.h"
 #include "testutil/TestStreams.h"
+#include "testutil/TestUtil.h"
 
 namespace objopstest {
 
 using namespace sarn;
+using sarntest::Str;
 
-// The JSON of a tree read as an object at version 0 (through the Dictionary converter); null
-// when either step refuses it.
+// JSON read as an object at version 0 through the Dictionary converter; null when refused.
 inline ref<SarnObject> FromJson(VekMempool* pool, const std::string& json) {
   VekString error;
-  ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(json.data()), json.size(), error, pool);
   ref<SarnObject> object;
-  DictionarySarnObject converter(pool, Schema::vStructDefG, Schema::nStructDefG);
-  if (tree) converter.DictionaryToSarnObject(tree, 0, object, error);
+  ref<Dictionary> tree = Dictionary::FromJson(VekString(json.c_str()), error, pool);
+  if (tree) DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG).DictionaryToSarnObject(tree, 0, object, error);
   return object;
-}
-
-inline ref<SarnObject> JsonCopy(VekMempool* pool, const SarnObject* object) {
-  return FromJson(pool, sarntest::Str(JsonSarnObject(pool).SarnObjectToJson(object, 0)));
 }
 
 inline ref<SarnObject> BinaryCopy(VekMempool* pool, const SarnObject* object) {
   ProtoBuf codec(pool, Schema::vStructDefG, Schema::nStructDefG);
   ProtoBufByteOutputStream out;
   codec.MarshalKnownDict(object, &out);
-  std::string bytes = sarntest::Finished(out);
+  const std::string bytes = sarntest::Finished(out);
   ref<SarnObject> copy;
   codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &copy);
   return copy;
 }
 
-inline const FieldInfo* FieldNamed(const StructInfo* info, const char* name) {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const FieldInfo& field = info->vFieldInfo[n];  // placeholders (arity NONE) share name offset 0
-    if (field.arity != SARN_ARITY_NONE && std::strcmp(FieldName(info, field), name) == 0) return &field;
+inline const FieldInfo* FieldNamed(const StructInfo* info, const std::string& name) {
+  for (unsigned n = 0; info != nullptr && n < info->nFieldInfo; ++n) {  // placeholders share name offset 0
+    if (info->vFieldInfo[n].arity != SARN_ARITY_NONE && name == FieldName(info, info->vFieldInfo[n])) return &info->vFieldInfo[n];
   }
   return nullptr;
 }
 
-// A nest of `depth` lists (unifiedItemList), each holding the next as its one item; the innermost
-// holds a success with `message`.
+// An object of the type before the dot in `subject` whose field after it is `text`: a JSON value,
+// raw scalars or null references ("0x..|0x..", "0X": an optional field's storage without its
+// presence), a payload held as JSON text ("json:..."), or the default ("~").
+inline ref<SarnObject> Side(VekMempool* pool, const std::string& subject, const std::string& text, const FieldInfo*& field) {
+  const std::string type = subject.substr(0, subject.find('.')), name = subject.substr(subject.find('.') + 1);
+  const bool isRaw = text.rfind("0x", 0) == 0 || text.rfind("0X", 0) == 0, isLazy = text.rfind("json:", 0) == 0;
+  ref<SarnObject> object = text == "~" || isRaw || isLazy ? StructInfoMap::LookupStructByName(type.c_str())->pFactory(pool)
+                                                         : FromJson(pool, "{\"type\": \"" + type + "\", \"" + name + "\": " + text + "}");
+  field = FieldNamed(object->GetStructInfo(), name);
+  if (isLazy) FieldAccess::PutReference(object.Get(), *field, LazyDict::FromJsonString(pool, VekString(text.c_str() + 5), 0).Get());
+  std::stringstream values(isRaw ? text : "");
+  for (std::string value; std::getline(values, value, '|');) {
+    const uint64_t bits = std::stoull(value, nullptr, 16);
+    TraitsOf(field->dataType).storage == DataTypeTraits::STORAGE_REFERENCE ? FieldAccess::PutReference(object.Get(), *field, nullptr)
+                                                                          : FieldAccess::PutScalar(object.Get(), *field, &bits);
+    if (text[1] == 'x') MarkFieldPresent(object.Get(), *field);
+  }
+  return object;
+}
+
+// Whether objects of the type may hold a field of `dataType` (`isAll` false: a required or multi one).
+inline bool Holds(unsigned typeId, unsigned dataType, bool isAll, int depth = 0) {
+  const StructInfo* info = StructInfoForId(typeId);
+  for (unsigned n = 0; info != nullptr && depth < 6 && n < info->nFieldInfo; ++n) {
+    const FieldInfo& f = info->vFieldInfo[n];
+    if (f.arity == SARN_ARITY_NONE || (!isAll && f.arity == SARN_ARITY_OPTIONAL && f.dataType == dataType)) continue;
+    if (f.dataType == dataType || (f.dataType == SARN_DATA_TYPE_SUBDICT && Holds(f.refIndex, dataType, isAll, depth + 1))) return true;
+  }
+  return false;
+}
+
+// `depth` lists (unifiedItemList), each holding the next as its one item, around a success.
 inline ref<SarnObject> Nest(VekMempool* pool, int depth, const std::string& message) {
-  ref<SarnObject> inner = FromJson(pool, "{\"type\":\"success\",\"message\":\"" + message + "\"}");
-  for (int level = 0; level < depth; ++level) {
+  ref<SarnObject> inner = FromJson(pool, "{\"type\": \"success\", \"message\": \"" + message + "\"}");
+  for (const FieldInfo* item = FieldNamed(StructInfoForId(644), "item"); depth-- > 0;) {
     ref<SarnObject> outer = StructInfoForId(644)->pFactory(pool);
-    FieldAccess::PutReference(outer.Get(), *FieldNamed(outer->GetStructInfo(), "item"), inner.Get());
+    FieldAccess::PutReference(outer.Get(), *item, inner.Get());
     inner = outer;
   }
   return inner;

@@ -4,12 +4,14 @@
 // byte for byte with the files `stdout`, `stderr` and `status` (a missing file means empty, or 0).
 // SARN_UPDATE_GOLDEN=1 writes what the programs did into those files instead, for review.
 #include <dirent.h>
+#include <unistd.h>
 #include <sys/wait.h>
 
 #include <algorithm>
 #include <cctype>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <string>
 #include <vector>
@@ -56,7 +58,11 @@ TEST_P(ToolGolden, MatchesGoldenFiles) {
   const char* toolDir = std::getenv("SARN_TOOL_DIR");
   if (toolDir == nullptr) GTEST_SKIP() << "the programs are not built (SARN_TOOL_DIR is not set)";
   std::string dir = CasesDir() + "/" + GetParam();
-  std::string scratch = ::testing::TempDir() + "sarn-golden-" + GetParam();
+  // Scratch files live in a folder of this process's own, since several builds may run the
+  // same cases at once; SCRATCH is a path prefix inside it.
+  std::string scratchDir = ::testing::TempDir() + "sarn-golden-" + std::to_string(getpid());
+  std::filesystem::create_directories(scratchDir);
+  std::string scratch = scratchDir + "/" + GetParam();
   std::string input = dir + "/stdin", unused;
   if (!sarntest::ReadFile(input, unused)) input = "/dev/null";
   // The programs' folders first on PATH; SARN_SOURCE_DIR stays set for scripts that use the tree.
@@ -66,6 +72,8 @@ TEST_P(ToolGolden, MatchesGoldenFiles) {
   ASSERT_TRUE(WIFEXITED(raw)) << "the case's shell did not exit normally";
   std::string status = std::to_string(WEXITSTATUS(raw)) + "\n";
   std::string out = ReadOrEmpty(scratch + ".out"), err = ReadOrEmpty(scratch + ".err");
+  std::error_code ignored;
+  std::filesystem::remove_all(scratchDir, ignored);
   if (const char* update = std::getenv("SARN_UPDATE_GOLDEN"); update != nullptr && std::string(update) == "1") {
     WriteGolden(dir + "/stdout", out);
     WriteGolden(dir + "/stderr", err);

@@ -145,7 +145,12 @@ int Context::UsageError(const std::string& message) {
 }
 
 void Context::Report(const std::string& input, const std::string& message, int status) {
-  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pName, input.c_str(), message.c_str());
+  if (!bufferM.empty()) Finish();
+  // One line per diagnostic: a message that ends in line breaks loses them, and one that spans
+  // lines (the streaming JSON parser's) has them turned into blanks.
+  std::string line = message.substr(0, message.find_last_not_of("\r\n") + 1);
+  for (char& c : line) c = c == '\n' || c == '\r' ? ' ' : c;
+  std::fprintf(stderr, "sarn: %s: %s: %s\n", commandM.pName, input.c_str(), line.c_str());
   Raise(status);
 }
 
@@ -157,6 +162,19 @@ bool Context::OpenOutput() {
 }
 
 void Context::Write(const char* data, size_t size) {
+  if (bufferM.size() + size > kBufferBytes) Finish();
+  if (size > kBufferBytes) return WriteNow(data, size);
+  bufferM.append(data, size);
+}
+
+int Context::Finish() {
+  std::string pending;
+  pending.swap(bufferM);
+  WriteNow(pending.data(), pending.size());
+  return statusM;
+}
+
+void Context::WriteNow(const char* data, size_t size) {
   if (outputM.Write(data, size)) return;
   if (errno == EPIPE) std::_Exit(statusM);
   Report(Value("-o", "-"), std::strerror(errno), STATUS_USAGE);

@@ -5,7 +5,8 @@
 // - exit status 0 when every input was read and is valid (and for --help), 1 when an input was
 //   refused or invalid, 2 for a usage or I/O error; a later input never lowers the status;
 // - standard output carries results only, byte for byte; every diagnostic is one line on
-//   standard error, "sarn: COMMAND: INPUT: message", the library's texts unchanged; a usage
+//   standard error, "sarn: COMMAND: INPUT: message", the library's texts unchanged (but for
+//   line breaks inside a message, which become blanks); a usage
 //   error adds the line "Try 'sarn COMMAND --help'.";
 // - "-" names standard input;
 // - a closed output pipe ends the tool at once and quietly, with the status reached so far, as
@@ -89,10 +90,13 @@ class Context {
 
   // Opens the output named by -o; false after reporting an I/O error.
   bool OpenOutput();
-  // Writes a result; a closed pipe ends the process quietly with the status so far.
+  // Writes a result. Results are collected in a buffer of 64 KiB, written when it is full, before
+  // each diagnostic (so that the two streams keep their order on a terminal) and by Finish; a
+  // closed pipe ends the process quietly with the status so far.
   void Write(const char* data, size_t size);
   void Write(const std::string& text) { Write(text.data(), text.size()); }
-  Output& GetOutput() { return outputM; }
+  // Writes what is buffered; returns the status.
+  int Finish();
 
   // Reads a whole input ("-": standard input) of at most `limit` bytes; false after reporting
   // the failure (an I/O error, status 2; an input past the limit, status 1).
@@ -110,11 +114,16 @@ class Context {
   std::vector<std::pair<std::string, std::string>> givenM;
   int statusM;
   Output outputM;
+  std::string bufferM;
+  static constexpr size_t kBufferBytes = 65536;
+  void WriteNow(const char* data, size_t size);
 };
 
 // The commands, each in a file of its own.
 extern const Command kSchemaCommand;
 extern const Command kConvertCommand;
+extern const Command kDecodeCommand;
+extern const Command kEncodeCommand;
 extern const Command kValidateCommand;
 
 // Names of the data types and arities as the schema tool prints them ("STRING", "optional").

@@ -1,5 +1,7 @@
 // sarn: the command-line tool over the library, written against its public interface only, as a
 // user's program would be. One command per file; this file dispatches.
+#include <malloc.h>
+
 #include <csignal>
 #include <cstdio>
 #include <cstring>
@@ -8,7 +10,8 @@
 
 namespace {
 
-const sarncli::Command* const kCommands[] = {&sarncli::kConvertCommand, &sarncli::kSchemaCommand,
+const sarncli::Command* const kCommands[] = {&sarncli::kConvertCommand, &sarncli::kDecodeCommand,
+                                             &sarncli::kEncodeCommand,  &sarncli::kSchemaCommand,
                                              &sarncli::kValidateCommand};
 
 void PrintHelp() {
@@ -37,6 +40,12 @@ int UsageError(const char* message, const char* argument) {
 int main(int argc, char** argv) {
   // A closed output pipe shows up as a failed write, which ends the tool quietly (Cli.cpp).
   std::signal(SIGPIPE, SIG_IGN);
+  // Each frame is read in a pool of its own, whose slabs come from malloc. Above glibc's default
+  // threshold every slab would be a fresh mapping, mapped and unmapped again for every frame;
+  // kept on the heap (and the heap not trimmed after every frame), the next frame reuses them.
+  // Memory still follows the largest frame: a frame is at most 6 MiB and a little.
+  mallopt(M_MMAP_THRESHOLD, 32 << 20);
+  mallopt(M_TRIM_THRESHOLD, 32 << 20);
   if (argc < 2) return UsageError("missing command", "");
   if (std::strcmp(argv[1], "--help") == 0) return PrintHelp(), 0;
   if (std::strcmp(argv[1], "--version") == 0) {
@@ -49,7 +58,8 @@ int main(int argc, char** argv) {
     if (std::strcmp(argv[1], command->pName) != 0) continue;
     // Each command declares its options and parses them itself.
     sarncli::Context context(*command, argc - 2, argv + 2);
-    return command->pMain(context);
+    int status = command->pMain(context);
+    return context.Finish() > status ? context.GetStatus() : status;
   }
   if (argv[1][0] == '-') return UsageError("unknown option '", argv[1]);
   return UsageError("unknown command '", argv[1]);

@@ -3,6 +3,9 @@
 #include <algorithm>
 #include <cctype>
 #include <cstdio>
+#include <cstring>
+#include <map>
+#include <unordered_map>
 
 namespace sarncli {
 namespace {
@@ -28,13 +31,22 @@ bool IsObjectField(unsigned dataType) {
   return dataType == sarn::SARN_DATA_TYPE_KNOWN_DICT || dataType == sarn::SARN_DATA_TYPE_SUBDICT;
 }
 
-// The record named `name` among the fields of `info` taking part at `version`, or null.
+// The record named `name` among the fields of `info` taking part at `version`, or null. The
+// names of a type at a version are indexed once: a large body repeats the same few types.
 const sarn::FieldInfo* FieldNamed(const sarn::StructInfo* info, const char* name, sarn::KernoVersion version) {
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const sarn::FieldInfo* field = sarn::FieldForVersion(info, n, version);
-    if (field != nullptr && std::strcmp(sarn::FieldName(info, *field), name) == 0) return field;
+  typedef std::unordered_map<std::string, const sarn::FieldInfo*> Index;
+  static std::map<std::pair<const sarn::StructInfo*, sarn::KernoVersion>, Index> indexes;
+  auto found = indexes.find({info, version});
+  if (found == indexes.end()) {
+    Index& index = indexes[{info, version}];
+    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+      const sarn::FieldInfo* field = sarn::FieldForVersion(info, n, version);
+      if (field != nullptr) index.emplace(sarn::FieldName(info, *field), field);
+    }
+    found = indexes.find({info, version});
   }
-  return nullptr;
+  auto field = found->second.find(name);
+  return field == found->second.end() ? nullptr : field->second;
 }
 
 void WalkNames(Context& context, const std::string& input, const sarn::Dictionary& dictionary,

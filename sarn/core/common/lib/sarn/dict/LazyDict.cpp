@@ -7,7 +7,6 @@
 #include "sarn/dict/LazyDict.h"
 
 #include <cstring>
-#include <new>
 
 #include "sarn/base/Limits.h"
 #include "sarn/binary/ProtoBuf.h"
@@ -21,7 +20,7 @@ namespace sarn {
 
 using internal::TreeRelease;
 
-const char kLazyDictNoDuplicateMessage[] = "Byte source could not be duplicated.";
+const char kLazyDictNoDuplicateMessage[] = "Byte source cannot be duplicated.";
 
 namespace internal {
 
@@ -62,40 +61,12 @@ LazyForm FormOf(const LazyDict& payload, const LazyNesting& nesting) {
   return form;
 }
 
-namespace {
-
-// A duplicate read through this counts what it delivers.
-class CountedSource : public wynbaselib::Bytesource {
- public:
-  CountedSource(wynbaselib::Bytesource* source, size_t* pCount) : pSourceM(source), pCountM(pCount) {}
-  ~CountedSource() override { delete pSourceM; }
-  size_t Read(void* buffer, size_t size) override {
-    size_t n = pSourceM->Read(buffer, size);
-    *pCountM += n;
-    return n;
-  }
-  Bytesource* Duplicate() override { return nullptr; }
-  bool FError() const override { return pSourceM->FError(); }
-  const char* GetErrorText() const override { return pSourceM->GetErrorText(); }
-
- private:
-  wynbaselib::Bytesource* pSourceM;
-  size_t* pCountM;
-};
-
-}  // namespace
-
-bool ReadBytesource(const LazyDict& payload, ref<Dictionary>& out, VekString& error, size_t* pBytesRead) {
+bool ReadBytesource(const LazyDict& payload, ref<Dictionary>& out, VekString& error) {
   wynbaselib::Bytesource* duplicate = payload.pBytesourceM->Duplicate();
   if (duplicate == nullptr) {
     out.Reset();
     error = VekString::Format(payload.GetMempool(), "%s", kLazyDictNoDuplicateMessage);
     return false;
-  }
-  if (pBytesRead != nullptr) {
-    CountedSource* counted = new (std::nothrow) CountedSource(duplicate, pBytesRead);
-    if (counted == nullptr) delete duplicate;
-    duplicate = counted;
   }
   VekString message;
   out = Dictionary::FromJsonBytesource(duplicate, message, payload.GetMempool());  // deletes the duplicate

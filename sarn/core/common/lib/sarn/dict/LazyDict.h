@@ -164,6 +164,6 @@ constexpr size_t kSinkPieceBytes = 16384;
 SARN_EXPORT ref<Dictionary> MakeErrorDictionary(VekMempool* pool, const VekString& text);
 
 // The reader's message for a byte source whose Duplicate() gives null.
-SARN_EXPORT extern const char kLazyDictNoDuplicateMessage[];  // "Byte source could not be duplicated."
+SARN_EXPORT extern const char kLazyDictNoDuplicateMessage[];  // "Byte source cannot be duplicated." (the direct reader's words)
 
 }  // namespace sarn

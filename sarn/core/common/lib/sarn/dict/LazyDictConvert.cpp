@@ -96,29 +96,36 @@ ref<vek::ByteBuffer> ObjectToProtobuf(const LazyDict& payload, const SarnObject*
 ref<SarnObject> JsonToObject(const LazyDict& payload, VekString& error) {
   VekMempool* pool = payload.GetMempool();
   ConversionLog log(pool);
+  ref<SarnObject> object;
   if (VekFeatures::FEnabled(kDirectJsonFeature)) {
-    // The direct reader of JSON objects is not in this build yet: the same result through a tree.
-    ref<Dictionary> tree = Dictionary::FromJsonBytestring(payload.bytesM, error, pool);
-    ref<SarnObject> object = tree ? TreeToObject(payload, tree, error) : ref<SarnObject>();
+    VekString message;
+    int length = static_cast<int>(payload.bytesM->GetLength());
+    if (!JsonSarnObject(pool).JsonToSarnObject(payload.bytesM->GetData(), length, payload.versionM, &object, message)) {
+      error = message;
+    }
     return log.Report("new REP_JSON", payload.bytesM->GetLength(), object);
   }
   ref<Dictionary> tree = Dictionary::FromJsonBytestring(payload.bytesM, error, pool);
-  ref<SarnObject> object = tree ? TreeToObject(payload, tree, error) : ref<SarnObject>();
+  if (tree) object = TreeToObject(payload, tree, error);
   return log.Report("old REP_JSON", 0, object);
 }
 
 // A byte source to an object: directly with feature 548, otherwise through a Dictionary.
 ref<SarnObject> BytesourceToObject(const LazyDict& payload, VekString& error) {
-  ConversionLog log(payload.GetMempool());
-  bool isDirect = VekFeatures::FEnabled(kDirectJsonFeature);
-  ref<Dictionary> tree;
+  VekMempool* pool = payload.GetMempool();
+  ConversionLog log(pool);
   ref<SarnObject> object;
-  size_t bytesRead = 0;
-  // The direct reader of JSON objects is not in this build yet: the same result through a tree.
-  if (internal::ReadBytesource(payload, tree, error, isDirect ? &bytesRead : nullptr)) {
-    object = TreeToObject(payload, tree, error);
+  if (VekFeatures::FEnabled(kDirectJsonFeature)) {
+    VekString message;
+    size_t bytesRead = 0;
+    if (!JsonSarnObject(pool).JsonToSarnObject(payload.pBytesourceM, bytesRead, payload.versionM, &object, message)) {
+      error = message;
+    }
+    return log.Report("new REP_BYTESOURCE", bytesRead, object);
   }
-  return log.Report(isDirect ? "new REP_BYTESOURCE" : "old REP_BYTESOURCE", bytesRead, object);
+  ref<Dictionary> tree;
+  if (internal::ReadBytesource(payload, tree, error)) object = TreeToObject(payload, tree, error);
+  return log.Report("old REP_BYTESOURCE", 0, object);
 }
 
 }  // namespace

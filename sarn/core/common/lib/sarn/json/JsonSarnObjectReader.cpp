@@ -15,6 +15,7 @@
 #include "sarn/dict/LazyDict.h"
 #include "sarn/json/JsonSarnObject.h"
 #include "sarn/json/internal/JsonNumberText.h"
+#include "sarn/json/internal/JsonObjectReader.h"
 #include "sarn/json/internal/JsonTokenScan.h"
 #include "sarn/model/FieldAccess.h"
 #include "sarn/model/StructInfoMap.h"
@@ -25,8 +26,12 @@
 
 namespace sarn {
 
+using internal::Append;
+using internal::IsAlnum;
 using internal::ReadToken;
+using internal::SkipPeek;
 using internal::SkipToken;
+using internal::Take;
 using internal::TokenText;
 
 namespace {
@@ -49,30 +54,8 @@ const char kSubdictMultiG[] = " failed to Unmarshal TYPE_OBJECT in Multi";
 const char kLazySingleG[] = " Single SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY can't Unmarshal";
 const char kLazyMultiG[] = " Multi SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY can't unmarshal";
 const char kNullLazyG[] = "null lazy dict";
-const char kBadAnyFieldG[] = "bad field in AnyDictValue";
-const char kAnyNoEndG[] = "expected , or }";
-const char kAnyBadStringG[] = "failed to read string in UnmarshalAnyDictValue";
-const char kAnyBadNameG[] = "UnmarshalAnyDictField can't read fieldName";
-const char kAnyNoColonG[] = "UnmarshalAnyDictField expected :";
-const char kAnyBadValueG[] = "bad value in AnyDictField";
 const char kNoDuplicateG[] = "Byte source cannot be duplicated.";
 const char kNegativeLengthG[] = "Negative JSON length.";
-
-void Append(VekMempool* pool, VekString& error, const char* piece, size_t n) {
-  error = VekString::Format(pool, "%s%.*s", error.Utf8(), static_cast<int>(n), piece);
-}
-void Append(VekMempool* pool, VekString& error, const char* piece) { Append(pool, error, piece, std::strlen(piece)); }
-
-// Skip, then take one byte (0 at the end of the input).
-inline char Take(InputPointerBytesource& input) {
-  input.SkipWhitespace();
-  return input.Next();
-}
-inline char SkipPeek(InputPointerBytesource& input) {
-  input.SkipWhitespace();
-  return input.Peek();
-}
-inline bool IsAlnum(char c) { return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z'); }
 
 // Writes to two sinks: an echo already running on the cursor and the capture of a lazy member.
 struct TeeSink : wynbaselib::Bytesink {
@@ -86,161 +69,16 @@ struct TeeSink : wynbaselib::Bytesink {
   wynbaselib::Bytesink* pSecondM;
 };
 
-// FNV-1a over the bytes of a name.
-inline uint32_t NameHash(const unsigned char* p, size_t n) {
-  uint32_t h = 2166136261u;
-  for (size_t i = 0; i < n; ++i) h = (h ^ p[i]) * 16777619u;
-  return h;
-}
-
 }  // namespace
-
-// Scratch kept by a converter between reads (in the default pool, like vObjectTypesM, so that a
-// read leaves the caller's pool as it found it): a field-name index per type met, the keys of
-// the members being read (for messages), and the state of the current read.
-struct JsonSarnObject::ReadState {
-  struct NameIndex {
-    const StructInfo* pTypeM;
-    uint16_t* vSlotM;  // field number + 1, 0 for an empty slot
-    uint32_t maskM;
-  };
-  static constexpr unsigned kIndexes = 64;
-  NameIndex vIndexM[kIndexes];
-  char* pKeysM;  // the keys of the members open, end to end
-  size_t nKeysM;
-  size_t capKeysM;
-  bool isFirstPassM;      // array elements may be separated by whitespace alone
-  bool isDepthRefusedM;   // the nesting limit refused a container: its message must reach the caller
-
-  // The field named [key, key + n) of `type`, or null. A key never holds a NUL (the token reader
-  // refuses one in a quoted string and ends a bare token there).
-  const FieldInfo* Find(const StructInfo* type, const unsigned char* key, size_t n) {
-    NameIndex& index = vIndexM[(reinterpret_cast<uintptr_t>(type) >> 4) % kIndexes];
-    if (index.pTypeM != type && !Build(index, type)) return LinearFind(type, key, n);
-    for (uint32_t slot = NameHash(key, n) & index.maskM;; slot = (slot + 1) & index.maskM) {
-      unsigned entry = index.vSlotM[slot];
-      if (entry == 0) return nullptr;
-      const FieldInfo& field = type->vFieldInfo[entry - 1];
-      const char* name = FieldName(type, field);
-      if (std::strncmp(name, reinterpret_cast<const char*>(key), n) == 0 && name[n] == '\0') {
-        return &field;
-      }
-    }
-  }
-  static const FieldInfo* LinearFind(const StructInfo* type, const unsigned char* key, size_t n) {
-    for (unsigned i = 0; i < type->nFieldInfo; ++i) {
-      const FieldInfo& field = type->vFieldInfo[i];
-      if (field.arity == SARN_ARITY_NONE) continue;
-      const char* name = FieldName(type, field);
-      if (std::strncmp(name, reinterpret_cast<const char*>(key), n) == 0 && name[n] == '\0') {
-        return &field;
-      }
-    }
-    return nullptr;
-  }
-  // Fills `index` for `type`, keeping the first field of each name; false when memory runs out
-  // (the caller then searches linearly).
-  bool Build(NameIndex& index, const StructInfo* type) {
-    uint32_t size = 8;
-    while (size < 2u * type->nFieldInfo) size *= 2;
-    auto* slots = static_cast<uint16_t*>(VekMempool::Default()->Calloc(size, sizeof(uint16_t)));
-    if (slots == nullptr) return false;
-    VekMempool::Default()->Free(index.vSlotM);
-    index.pTypeM = type;
-    index.vSlotM = slots;
-    index.maskM = size - 1;
-    for (unsigned i = 0; i < type->nFieldInfo; ++i) {
-      const FieldInfo& field = type->vFieldInfo[i];
-      if (field.arity == SARN_ARITY_NONE) continue;
-      const char* name = FieldName(type, field);
-      size_t n = std::strlen(name);
-      for (uint32_t slot = NameHash(reinterpret_cast<const unsigned char*>(name), n) & index.maskM;;
-           slot = (slot + 1) & index.maskM) {
-        if (slots[slot] == 0) {
-          slots[slot] = static_cast<uint16_t>(i + 1);
-          break;
-        }
-        if (std::strcmp(FieldName(type, type->vFieldInfo[slots[slot] - 1]), name) == 0) break;  // the first stays
-      }
-    }
-    return true;
-  }
-  // Remembers a key; returns its offset, or -1 when memory runs out.
-  long PushKey(const unsigned char* key, size_t n) {
-    if (nKeysM + n > capKeysM) {
-      size_t capacity = capKeysM * 2 + n + 64;
-      auto* keys = static_cast<char*>(VekMempool::Default()->Realloc(pKeysM, capacity));
-      if (keys == nullptr) return -1;
-      pKeysM = keys;
-      capKeysM = capacity;
-    }
-    std::memcpy(pKeysM + nKeysM, key, n);
-    long at = static_cast<long>(nKeysM);
-    nKeysM += n;
-    return at;
-  }
-};
 
 void JsonSarnObject::ReleaseReadState() {
   if (pReadStateM == nullptr) return;
   for (auto& index : pReadStateM->vIndexM) VekMempool::Default()->Free(index.vSlotM);
   VekMempool::Default()->Free(pReadStateM->pKeysM);
+  pReadStateM->holdM = VekString();
   VekMempool::Default()->Free(pReadStateM);
   pReadStateM = nullptr;
 }
-
-class JsonSarnObject::Reader {
- public:
-  static bool Object(JsonSarnObject& self, int depth, InputPointerBytesource& input, const StructInfo* type,
-                     ref<SarnObject>* result, VekString& error);
-  static bool Value(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
-                    SarnObject* object, VekString& error);
-  static bool Single(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
-                     SarnObject* object, VekString& error);
-  static bool Multi(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
-                    SarnObject* object, VekString& error);
-  static bool Array(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
-                    SarnObject* object, VekString& error);
-  static bool Element(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
-                      SarnObject* object, VekString& error);
-  static bool AnyValue(JsonSarnObject& self, int depth, InputPointerBytesource& input, dictvalue::Type& type,
-                       VekString& text, ref<Dict>& dict, VekString& error);
-  static bool AnyField(JsonSarnObject& self, int depth, InputPointerBytesource& input, const ref<Dict>& dict,
-                       VekString& error);
-  static bool TwoPass(JsonSarnObject& self, InputPointerBytesource& first, InputPointerBytesource& second,
-                      ref<SarnObject>* result, VekString& error);
-  static ReadState* State(JsonSarnObject& self);
-
- private:
-  // One value of a field that holds no objects, converted and stored (a single field) or appended.
-  static bool Scalar(JsonSarnObject& self, InputPointerBytesource& input, const FieldInfo& field, SarnObject* object,
-                     VekString& error);
-  static bool Store(JsonSarnObject& self, bool isStored, const FieldInfo& field, SarnObject* object,
-                    VekString& error);
-  static bool Nested(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo& field,
-                     SarnObject* object, VekString& error, const char* multiWords);
-  static bool Lazy(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo& field,
-                   SarnObject* object, VekString& error, bool isMulti);
-  static bool FreeForm(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo& field,
-                       SarnObject* object, VekString& error);
-  static bool TooDeep(JsonSarnObject& self, int level, VekString& error);
-  // The first pass's value of a "type" member, looked up and recorded for object `ordinal`. Kept
-  // out of Object, whose frame is paid once per nesting level.
-  static bool RecordType(JsonSarnObject& self, InputPointerBytesource& input, uint32_t ordinal, VekString& error)
-      __attribute__((noinline));
-  // An inner text that the Part drops is kept when it carries the depth message.
-  static void Discard(JsonSarnObject& self, VekString& error, const VekString& inner) {
-    if (State(self)->isDepthRefusedM) Append(self.pMempoolM, error, inner.Utf8(), inner.NByte());
-  }
-  // A message that replaces the inner one, unless that carries the depth message.
-  static void Replace(JsonSarnObject& self, VekString& error, const char* text) {
-    if (State(self)->isDepthRefusedM) {
-      Append(self.pMempoolM, error, text);
-    } else {
-      error = VekString::Format(self.pMempoolM, "%s", text);
-    }
-  }
-};
 
 JsonSarnObject::ReadState* JsonSarnObject::Reader::State(JsonSarnObject& self) {
   if (self.pReadStateM == nullptr) {
@@ -260,7 +98,8 @@ bool JsonSarnObject::Reader::TooDeep(JsonSarnObject& self, int level, VekString&
 bool JsonSarnObject::Reader::RecordType(JsonSarnObject& self, InputPointerBytesource& input, uint32_t ordinal,
                                         VekString& error) {
   TokenText name;
-  if (!ReadToken(self.pMempoolM, input, name)) {
+  VekString& hold = State(self)->holdM;
+  if (!ReadToken(self.pMempoolM, input, name, hold)) {
     Append(self.pMempoolM, error, kBadTypeG);
     return false;
   }
@@ -273,7 +112,7 @@ bool JsonSarnObject::Reader::RecordType(JsonSarnObject& self, InputPointerByteso
       text[name.nM] = '\0';
       named = StructInfoMap::LookupStructByName(text);
     } else {
-      VekString copy = name.holdM.FEmpty() ? VekString::FromUtf8Bytes(self.pMempoolM, name.nM, name.pM) : name.holdM;
+      VekString copy = internal::TokenString(self.pMempoolM, name, hold);
       named = StructInfoMap::LookupStructByName(copy.Utf8());
     }
   }
@@ -318,7 +157,7 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
     char c = SkipPeek(input);
     if (c != '"' && !IsAlnum(c)) break;
     TokenText key;
-    if (!ReadToken(pool, input, key)) {
+    if (!ReadToken(pool, input, key, state->holdM)) {
       Append(pool, error, kBadKeyG);
       return false;
     }
@@ -330,7 +169,6 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
       return false;
     }
     size_t keyLength = key.nM;
-    key.holdM = VekString();
     if (Take(input) != ':') {
       Append(pool, error, kNoColonG);
       return false;
@@ -551,10 +389,11 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
                                     SarnObject* object, VekString& error) {
   VekMempool* pool = self.pMempoolM;
   TokenText token;
-  if (!ReadToken(pool, input, token)) return false;
+  VekString& hold = State(self)->holdM;
+  if (!ReadToken(pool, input, token, hold)) return false;
   const unsigned char* p = token.pM;
   size_t n = token.nM;
-  auto text = [&]() { return token.holdM.FEmpty() ? VekString::FromUtf8Bytes(pool, n, p) : token.holdM; };
+  auto text = [&]() { return internal::TokenString(pool, token, hold); };
   bool isNegative;
   unsigned long long digits;
   switch (field.dataType) {
@@ -674,95 +513,6 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
   }
 }
 
-// ---- Free-form dictionaries -------------------------------------------------------------------
-
-bool JsonSarnObject::Reader::AnyValue(JsonSarnObject& self, int depth, InputPointerBytesource& input,
-                                      dictvalue::Type& type, VekString& text, ref<Dict>& dict, VekString& error) {
-  VekMempool* pool = self.pMempoolM;
-  if (SkipPeek(input) != '{') {
-    type = dictvalue::TYPE_STRING;
-    TokenText token;
-    if (!ReadToken(pool, input, token)) {
-      Replace(self, error, kAnyBadStringG);
-      return false;
-    }
-    text = token.holdM.FEmpty() ? VekString::FromUtf8Bytes(pool, token.nM, token.pM) : token.holdM;
-    return true;
-  }
-  type = dictvalue::TYPE_DICT;
-  input.Next();
-  ++self.nObjectIndexM;  // the first pass gave this object an ordinal too
-  if (TooDeep(self, depth + 1, error)) return false;
-  for (;;) {
-    if (!dict) {
-      dict = MakeDict(pool);
-      if (!dict) {
-        Replace(self, error, kOutOfMemoryMessage);
-        return false;
-      }
-    }
-    if (!AnyField(self, depth + 1, input, dict, error)) {
-      Replace(self, error, kBadAnyFieldG);
-      return false;
-    }
-    char c = Take(input);
-    if (c == '}') return true;
-    if (c != ',') {
-      Replace(self, error, kAnyNoEndG);
-      return false;
-    }
-  }
-}
-
-bool JsonSarnObject::Reader::AnyField(JsonSarnObject& self, int depth, InputPointerBytesource& input,
-                                      const ref<Dict>& dict, VekString& error) {
-  VekMempool* pool = self.pMempoolM;
-  VekString name;
-  if (!JsonBytesourceToString(pool, nullptr, input, name)) {
-    Replace(self, error, kAnyBadNameG);
-    return false;
-  }
-  if (Take(input) != ':') {
-    Replace(self, error, kAnyNoColonG);
-    return false;
-  }
-  bool isList = SkipPeek(input) == '[';
-  if (isList) {
-    input.Next();
-    if (TooDeep(self, depth + 1, error)) return false;
-    ++depth;
-  }
-  for (;;) {
-    uint64_t before = input.BytesDelivered() - static_cast<uint64_t>(input.pEndM - input.pCurM);
-    dictvalue::Type type = dictvalue::TYPE_NONE;
-    VekString text;
-    ref<Dict> value;
-    if (!AnyValue(self, depth, input, type, text, value, error)) {
-      Replace(self, error, kAnyBadValueG);
-      return false;
-    }
-    uint64_t after = input.BytesDelivered() - static_cast<uint64_t>(input.pEndM - input.pCurM);
-    bool isAdded = type == dictvalue::TYPE_DICT ? dict->AddDict(name, value) : dict->AddString(name, text);
-    if (!isAdded) {
-      bool isFull = dict->CountValues(name) >= kMaxValuesPerContainer;
-      Replace(self, error, isFull ? kJsonRepeatedKeyLimitMessage : kOutOfMemoryMessage);
-      return false;
-    }
-    if (!isList) return true;
-    char c = SkipPeek(input);
-    // A value that read nothing is only the empty one before the closing bracket.
-    if (before == after && c != ']') {
-      Replace(self, error, kAnyBadValueG);
-      return false;
-    }
-    if (c == ']') {
-      input.Next();
-      return true;
-    }
-    if (c == ',') input.Next();
-  }
-}
-
 // ---- Entry points -----------------------------------------------------------------------------
 
 bool JsonSarnObject::Reader::TwoPass(JsonSarnObject& self, InputPointerBytesource& first,
@@ -785,13 +535,15 @@ bool JsonSarnObject::Reader::TwoPass(JsonSarnObject& self, InputPointerBytesourc
   if (type != nullptr) {
     self.nObjectIndexM = 0;
     ref<SarnObject> object;
-    if (Object(self, 0, second, type, &object, error)) {
-      if (result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
-      return true;
-    }
+    isOk = Object(self, 0, second, type, &object, error);
+    if (isOk && result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
   }
-  if (result != nullptr) result->Reset();
-  return false;
+  state->holdM = VekString();  // nothing of the read stays in the caller's pool
+  if (type == nullptr || !isOk) {
+    if (result != nullptr) result->Reset();
+    return false;
+  }
+  return true;
 }
 
 bool JsonSarnObject::JsonToSarnObject(InputPointerBytesource& firstPass, InputPointerBytesource& secondPass,
@@ -864,36 +616,6 @@ bool JsonSarnObject::ArrayValueFromJson(int depth, InputPointerBytesource& input
 bool JsonSarnObject::ArrayValueReadFieldValue(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                               ref<SarnObject> object, VekString& error) {
   return Reader::State(*this) != nullptr && Reader::Element(*this, depth, input, field, object.Get(), error);
-}
-
-bool JsonSarnObject::UnmarshalAnyDict(int depth, InputPointerBytesource& input, ref<Dict>* result,
-                                      VekString& error) {
-  if (Reader::State(*this) == nullptr) {
-    Append(pMempoolM, error, kOutOfMemoryMessage);
-    return false;
-  }
-  if (depth == 0) pReadStateM->isDepthRefusedM = false;
-  dictvalue::Type type = dictvalue::TYPE_NONE;
-  VekString text;
-  ref<Dict> dict;
-  if (!Reader::AnyValue(*this, depth, input, type, text, dict, error) || type != dictvalue::TYPE_DICT) return false;
-  if (result != nullptr) *result = dict;
-  return true;
-}
-
-bool JsonSarnObject::UnmarshalAnyDict(InputPointerBytesource& input, ref<Dict>* result) {
-  VekString error;
-  return UnmarshalAnyDict(0, input, result, error);
-}
-
-bool JsonSarnObject::UnmarshalAnyDictValue(int depth, InputPointerBytesource& input, dictvalue::Type& type,
-                                           VekString& text, ref<Dict>& dict, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::AnyValue(*this, depth, input, type, text, dict, error);
-}
-
-bool JsonSarnObject::UnmarshalAnyDictField(int depth, InputPointerBytesource& input, const ref<Dict>& dict,
-                                           VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::AnyField(*this, depth, input, dict, error);
 }
 
 }  // namespace sarn

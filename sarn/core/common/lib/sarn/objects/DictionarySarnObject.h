@@ -2,8 +2,9 @@
 // version (0: every field with its current description, and required fields not enforced).
 //
 // Object to Dictionary: a dictionary that starts with "type" (the type name) and holds every
-// present field under its name; scalars become StringValues (BOOL, S32, U32 and FLOAT bare, the
-// rest quoted), nested objects nested dictionaries, multi-valued fields ArrayValues (empty ones
+// present field under its name; scalars become StringValues (BOOL, S32, U32 and FLOAT marked bare,
+// the rest quoted; the writer still quotes any text that is not a bare token, so a float such as
+// 1.5 comes out as "1.5"), nested objects nested dictionaries, multi-valued fields ArrayValues (empty ones
 // and null references are left out); free-form dictionaries and lazy payloads are shared, not
 // copied. This direction fails only when memory runs out (the result is then null, never a tree
 // with a value missing), and it walks nested objects with an explicit stack, so any depth is

@@ -77,6 +77,35 @@ class SARN_EXPORT KernoRpcV2 {
   // cannot hold as text) and "Cannot convert JSON to Dict: " and the reader's message.
   static bool BodyToLazyDict(VekMempool* pool, const char* body, size_t bodyLength, bool parseBodyNow,
                              KernoVersion version, ref<LazyDict>& out, VekString& error);
+
+  // Version conversion (KernoRpcV2Convert.cpp): wrappers to the version-1 envelope objects and
+  // back, sharing bodies and headers instead of copying them, so a change inside a shared Dict is
+  // seen on both sides. Results are made in `pool`; neither reports errors.
+  //
+  // To version 1: a request update (tested first, being a request too) gives a kernoRpcRequestUpdate,
+  // a request a kernoRpcRequest (kernoVersion the wrapper's schema version, sendAndForget always
+  // present: true for ResponseCountNone, monitorFutureChanges true for ResponseCountMultiple; a
+  // count outside the three is taken as ResponseCountSingle), a response a kernoRpcResponse
+  // (kernoVersion unset), a cancel a kernoRpcCancel with its rpc id only; null for a null message or
+  // another kind. Headers are the wrapper's optional headers Dict, which a request or response
+  // always has (perhaps empty): the protocol-buffer envelope readers refuse an envelope with a
+  // headers field, so converted envelopes travel in binary through the generic known-dict path. A
+  // wrapper without body gives an envelope whose body field is unset (the binary writer skips it).
+  //
+  // To version 2, by type id: 974 a CancelWrapper; 975 a RequestWrapper, 2238 a
+  // RequestUpdateWrapper, each with a new Dict-form body made from the old body's Dict under the
+  // object's kernoVersion (975) or the old body's own version (2238), the request type being that
+  // Dict's first "type" text; 976 a ResponseWrapper over the object's own body (the wrapper's
+  // schema version is the body's; the object's kernoVersion is not used); 1449 a request of its
+  // own type with rpc id 0, schema version 7, ResponseCountNone and the object as its body. The
+  // response count: sendAndForget present and true gives ResponseCountNone, else
+  // monitorFutureChanges gives ResponseCountMultiple or ResponseCountSingle. Null for a null
+  // object, any other type id, a request, request update or response without body, and a request
+  // or request update whose body gives no Dict or a Dict without a "type" text (no request can be
+  // sent without a request type). A body of malformed JSON is not refused: its Dict is the
+  // payload's "error" dictionary, so the request's type is "error".
+  static ref<SarnObject> KernoRpcV2ToV1(VekMempool* pool, const ref<KernoRpcWrapper>& message);
+  static ref<KernoRpcWrapper> KernoRpcV1ToV2Wrapper(VekMempool* pool, const ref<SarnObject>& object);
 };
 
 }  // namespace sarn

@@ -58,9 +58,8 @@ struct LazyForm {
 LazyForm FormOf(const LazyDict& payload, const LazyNesting& nesting);
 
 // A fresh duplicate of the source through the streaming reader: `out` is whatever the reader
-// returned; true for a whole dictionary, otherwise the reason in `error`. With `pBytesRead`, the
-// bytes the reader took from the duplicate are added to it.
-bool ReadBytesource(const LazyDict& payload, ref<Dictionary>& out, VekString& error, size_t* pBytesRead = nullptr);
+// returned; true for a whole dictionary, otherwise the reason in `error`.
+bool ReadBytesource(const LazyDict& payload, ref<Dictionary>& out, VekString& error);
 // Stored JSON as a tree, or the "error" tree with the reader's message.
 ref<Dictionary> JsonToDictionaryOrError(const LazyDict& payload);
 // The payload's tree in the given form; on failure null with `error`, or with `isErrorTree` the

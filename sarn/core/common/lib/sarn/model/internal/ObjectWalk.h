@@ -1,5 +1,6 @@
 // ObjectWalk: the one walk over a tree of schema objects that the object writers share (JSON text,
-// Dictionary trees, protocol-buffer bytes), so that the order of fields, the version rule,
+// Dictionary trees, protocol-buffer bytes) and, in its paired form, equality, so that the order of
+// fields, the version rule,
 // presence, null references and nesting are decided in one place and each writer keeps only what
 // its format adds.
 //

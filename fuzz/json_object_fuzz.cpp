@@ -1,0 +1,134 @@
+// A JSON text read as an object by JsonSarnObject; byte 0 chooses the piece size of the byte
+// source (1, 7, 64 or 16,384 bytes per read), the rest is the text.
+// Oracles: no crash, leak or hang; the memory and byte-source entries agree (verdict, written
+// object or message), delete both duplicates and leave the source where it was; an accepted object
+// writes JSON (version 0) that reads back to an object writing the same text, except for texts of
+// the writer that this reader refuses (below); where the Dictionary path (Dictionary::FromJson,
+// then DictionaryToSarnObject at version 0) accepts the text too, both objects write the same
+// JSON, except for the differences that the two paths make by design (below).
+//
+// Written texts this reader refuses: a channel number or currency left INVALID in a required
+// field ("invalid"), an id of a type the registry lacks ("XXX"), an enum number without a name
+// ("INVALID_VALUE:n"), an empty free-form dictionary ({}). Control bytes written as backslash-u
+// read back as the six characters, which write the same text again, so the text is stable.
+//
+// Differences from the Dictionary path: free-form values (every scalar a string, one value per
+// list element, {} refused), a SUBDICT whose object names another type, lazy members (captured
+// text, not read), a repeated member (the later value here, the first there) and a repeated
+// "type" (the later one names the type here).
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <string>
+
+#include "sarn/Sarn.h"
+#include "../tests/testutil/TestStreams.h"
+
+namespace {
+
+using namespace sarn;
+using sarntest::PieceSource;
+using sarntest::Require;
+using sarntest::Str;
+
+struct Outcome {
+  bool isOkM;
+  std::string textM;  // the object written at version 0, or the message
+  ref<SarnObject> objectM;
+};
+
+Outcome FromMemory(VekMempool* pool, JsonSarnObject& reader, const std::string& text) {
+  Outcome out;
+  VekString error;
+  out.isOkM = reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
+                                      static_cast<int>(text.size()), 0, &out.objectM, error);
+  Require(out.isOkM == (out.objectM != nullptr));
+  out.textM = out.isOkM ? Str(JsonSarnObject(pool).SarnObjectToJson(out.objectM.Get(), 0)) : Str(error);
+  return out;
+}
+
+// True when an object of the tree holds a value of one of the data types in `mask` (bit = code);
+// known dicts and subdicts are searched through.
+bool Holds(const SarnObject* object, uint32_t mask) {
+  const StructInfo* info = object->GetStructInfo();
+  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+    const FieldInfo& field = info->vFieldInfo[n];
+    const unsigned type = field.dataType;
+    if (field.arity == SARN_ARITY_NONE || (!TraitsOf(type).isHoldingObjects && type != SARN_DATA_TYPE_ANY_DICT)) continue;
+    for (unsigned i = 0; i < FieldAccess::Count(object, field); ++i) {
+      VekCore* value = FieldAccess::ReferenceAt(object, field, i);
+      if (value == nullptr) continue;
+      if (mask & (1u << type)) return true;
+      if (type != SARN_DATA_TYPE_ANY_DICT && type != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY &&
+          Holds(static_cast<SarnObject*>(value), mask)) {
+        return true;
+      }
+    }
+  }
+  return false;
+}
+constexpr uint32_t kPathDifferencesG =
+    1u << SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY | 1u << SARN_DATA_TYPE_ANY_DICT | 1u << SARN_DATA_TYPE_SUBDICT;
+
+// True when a dictionary of the tree repeats a name.
+bool RepeatsName(const DictValue* value) {
+  if (value == nullptr) return false;
+  if (value->kindM == DictValue::KIND_ARRAY) {
+    const auto* array = static_cast<const ArrayValue*>(value);
+    for (unsigned k = 0; k < array->CountValues(); ++k) {
+      if (RepeatsName(array->GetValueAt(k).Get())) return true;
+    }
+  }
+  if (value->kindM != DictValue::KIND_DICTIONARY) return false;
+  const auto* dictionary = static_cast<const Dictionary*>(value);
+  VekStringArray names(nullptr);
+  dictionary->GetSortedNames(names);
+  for (int i = 0; i < names.Count(); ++i) {
+    if (dictionary->CountValues(names[i]) > 1 || RepeatsName(dictionary->Get(names[i]).Get())) return true;
+  }
+  return false;
+}
+
+bool RefusedWhenWritten(const std::string& text) {
+  return text.find("\"invalid\"") != std::string::npos || text.find("\"XXX\"") != std::string::npos ||
+         text.find("\"INVALID_VALUE:") != std::string::npos || text.find("{}") != std::string::npos;
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  if (size < 1 || size > 200000) return 0;
+  static const size_t kPieces[] = {1, 7, 64, 16384};
+  const size_t piece = kPieces[data[0] % 4];
+  const std::string text(reinterpret_cast<const char*>(data + 1), size - 1);
+  VekMempool pool("fuzz");
+  {
+    JsonSarnObject reader(&pool);
+    Outcome memory = FromMemory(&pool, reader, text);
+
+    PieceSource::Counters counters;
+    PieceSource source(std::make_shared<const std::string>(text), piece, &counters);
+    ref<SarnObject> object;
+    VekString error;
+    size_t bytesRead = 0;
+    bool isOk = reader.JsonToSarnObject(&source, bytesRead, 0, &object, error);
+    Require(isOk == memory.isOkM && counters.nDuplicatedM == 2 && counters.nDeletedM == 2 && source.Position() == 0);
+    Require(bytesRead <= text.size());
+    Require((isOk ? Str(JsonSarnObject(&pool).SarnObjectToJson(object.Get(), 0)) : Str(error)) == memory.textM);
+    if (!isOk) return 0;
+
+    Outcome again = FromMemory(&pool, reader, memory.textM);
+    Require(again.isOkM ? again.textM == memory.textM : RefusedWhenWritten(memory.textM));
+
+    VekString treeError;
+    ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(text.data()), text.size(),
+                                                treeError, &pool);
+    if (!tree) return 0;
+    DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
+    ref<SarnObject> viaTree;
+    if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return 0;
+    if (Holds(memory.objectM.Get(), kPathDifferencesG) || RepeatsName(tree.Get())) return 0;
+    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == memory.textM);
+  }
+  return 0;
+}
