@@ -13,7 +13,6 @@ namespace {
 using namespace sarn;
 using sarntest::Str;
 using Impl = KernoRpcV2BytestreamImpl;
-using Rows = std::vector<std::vector<std::string>>;
 
 const Impl::LazinessSettings kSettings[] = {Impl::LazyUnparsed, Impl::LazyValidated, Impl::ParsedToDictionary};
 
@@ -101,14 +100,12 @@ struct RpcMessageTest : sarntest::PoolTest {
     return Str(errors[0]) + " / " + Str(errors[1]) + " / " + Str(errors[2]) + " / [" + frame + "]";
   }
 
+  template <class T>
+  static bool Same(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
+    return dynamic_cast<T*>(a.Get()) && dynamic_cast<T*>(b.Get()) && *dynamic_cast<T*>(a.Get()) == *dynamic_cast<T*>(b.Get());
+  }
   static bool Equal(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-    auto* qa = dynamic_cast<RequestWrapper*>(a.Get());
-    auto* qb = dynamic_cast<RequestWrapper*>(b.Get());
-    auto* ra = dynamic_cast<ResponseWrapper*>(a.Get());
-    auto* rb = dynamic_cast<ResponseWrapper*>(b.Get());
-    auto* ca = dynamic_cast<CancelWrapper*>(a.Get());
-    auto* cb = dynamic_cast<CancelWrapper*>(b.Get());
-    return (qa && qb && *qa == *qb) || (ra && rb && *ra == *rb) || (ca && cb && *ca == *cb);
+    return Same<RequestWrapper>(a, b) || Same<ResponseWrapper>(a, b) || Same<CancelWrapper>(a, b);
   }
 
   // Reader 0 is the string reader keeping the body, 1 parsing it; 2 to 4 the byte-source reader
@@ -213,6 +210,7 @@ TEST_F(RpcMessageTest, WritersAndRoundTrips) {
 
 TEST_F(RpcMessageTest, Readers) {
   // frame => string reader => byte-source reader in settings 0, 1, 2 ("=": as the field before)
+  EXPECT_EQ(ReadText(1, Frame("RpcId: 1\r\nType: response\r\n\r\n##{\"a\": }")), "error Cannot convert JSON to Dict: Empty scalar value for Object field a Failed to parse value for key a");
   for (const auto& row : sarntest::ReadTable("rpc/readers.txt", 5)) {
     const std::string frame = Frame(row[0]);
     std::string expected = row[1];

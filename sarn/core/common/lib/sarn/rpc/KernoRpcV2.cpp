@@ -9,6 +9,7 @@
 #include "sarn/base/Limits.h"
 #include "sarn/rpc/KernoRpcV2Packetizer.h"
 #include "sarn/rpc/RpcV2Parser.h"
+#include "sarn/rpc/internal/HeaderNames.h"
 
 namespace sarn {
 
@@ -20,6 +21,7 @@ const char KernoRpcV2::MissingBodyMessage[] = "Missing message body";
 namespace {
 
 using Keys = RpcV2Parser::HeaderKeys;
+inline const internal::HeaderNames& Names() { return internal::HeaderNames::Get(); }
 
 void Append(VekMempool* pool, VekString& error, const char* text) {
   error = VekString::Format(pool, "%s%s", error.Utf8(), text);
@@ -50,7 +52,7 @@ class FrameWriter {
       return false;
     }
     // A request, update or response without body bytes would be refused by every reader.
-    if (bodyLength == 0 && !headersM->GetString(Keys::Type, 0).FEqual(RpcV2Parser::TypeValues::Cancel)) {
+    if (bodyLength == 0 && !headersM->GetString(Names().typeM, 0).FEqual(RpcV2Parser::TypeValues::Cancel)) {
       Append(pMempoolM, error, KernoRpcV2::MissingBodyMessage);
       return false;
     }
@@ -343,37 +345,37 @@ ref<KernoRpcWrapper> KernoRpcV2::UnmarshalFromString(VekMempool* pool, const Vek
 
 ref<KernoRpcWrapper> KernoRpcV2::BuildWrapperFromHeaders(VekMempool* pool, ref<Dict>& headers, const char* body,
                                                          size_t bodyLength, bool parseBodyNow, VekString& error) {
-  if (headers->CountValues(Keys::RpcId) == 0) {
+  if (headers->CountValues(Names().rpcIdM) == 0) {
     Replace(pool, error, "Missing rpcId");
     return nullptr;
   }
-  const VekString contentType = headers->GetString(Keys::ContentType, 0);
+  const VekString contentType = headers->GetString(Names().contentTypeM, 0);
   if (!contentType.FEmpty() && !contentType.FEqual(RpcV2Parser::ContentTypeValues::ApplicationJson)) {
     error = VekString::Format(pool, "Unsupported Content-Type: '%s'", contentType.Utf8());
     return nullptr;
   }
-  const unsigned rpcId = Dict::ParseU32(pool, headers->GetString(Keys::RpcId, 0).Utf8());
+  const unsigned rpcId = Dict::ParseU32(pool, headers->GetString(Names().rpcIdM, 0).Utf8());
   const KernoVersion version =
-      static_cast<KernoVersion>(Dict::ParseU32(pool, headers->GetString(Keys::SchemaVersion, 0).Utf8()));
-  const VekString type = headers->GetString(Keys::Type, 0);
+      static_cast<KernoVersion>(Dict::ParseU32(pool, headers->GetString(Names().schemaVersionM, 0).Utf8()));
+  const VekString type = headers->GetString(Names().typeM, 0);
   ref<LazyDict> payload;
 
   if (type.FEqual(RpcV2Parser::TypeValues::Request)) {
     RequestWrapper::ResponseCount count;
-    if (headers->CountValues(Keys::ResponseCount) == 0) {
+    if (headers->CountValues(Names().responseCountM) == 0) {
       Replace(pool, error, "Missing ResponseCount in request");
       return nullptr;
     }
-    if (!ResponseCountOf(headers->GetString(Keys::ResponseCount, 0), count)) {
+    if (!ResponseCountOf(headers->GetString(Names().responseCountM, 0), count)) {
       Replace(pool, error, "Invalid value for ResponseCount header");
       return nullptr;
     }
-    if (headers->CountValues(Keys::RequestType) == 0) {
+    if (headers->CountValues(Names().requestTypeM) == 0) {
       Replace(pool, error, "Missing RequestType in request");
       return nullptr;
     }
     if (!BodyToLazyDict(pool, body, bodyLength, parseBodyNow, version, payload, error)) return nullptr;
-    ref<RequestWrapper> request = RequestWrapper::New(pool, rpcId, headers->GetString(Keys::RequestType, 0), count,
+    ref<RequestWrapper> request = RequestWrapper::New(pool, rpcId, headers->GetString(Names().requestTypeM, 0), count,
                                                       version, payload, nullptr);
     if (!request) return Replace(pool, error, kOutOfMemoryMessage), nullptr;
     request->contentTypeM = contentType;
@@ -381,13 +383,13 @@ ref<KernoRpcWrapper> KernoRpcV2::BuildWrapperFromHeaders(VekMempool* pool, ref<D
     return request;
   }
   if (type.FEqual(RpcV2Parser::TypeValues::RequestUpdate)) {
-    if (headers->CountValues(Keys::RequestType) == 0) {
+    if (headers->CountValues(Names().requestTypeM) == 0) {
       Replace(pool, error, "Missing RequestType header.");
       return nullptr;
     }
     if (!BodyToLazyDict(pool, body, bodyLength, parseBodyNow, version, payload, error)) return nullptr;
     ref<RequestUpdateWrapper> update =
-        RequestUpdateWrapper::New(pool, rpcId, headers->GetString(Keys::RequestType, 0), payload, nullptr);
+        RequestUpdateWrapper::New(pool, rpcId, headers->GetString(Names().requestTypeM, 0), payload, nullptr);
     if (!update) return Replace(pool, error, kOutOfMemoryMessage), nullptr;
     update->contentTypeM = contentType;
     update->SetOptionalHeaders(headers);
@@ -395,7 +397,7 @@ ref<KernoRpcWrapper> KernoRpcV2::BuildWrapperFromHeaders(VekMempool* pool, ref<D
   }
   if (type.FEqual(RpcV2Parser::TypeValues::Response)) {
     if (!BodyToLazyDict(pool, body, bodyLength, parseBodyNow, version, payload, error)) return nullptr;
-    const bool isFinal = headers->GetString(Keys::IsFinal, 0).FEqual("true");
+    const bool isFinal = headers->GetString(Names().isFinalM, 0).FEqual("true");
     ref<ResponseWrapper> response = ResponseWrapper::New(pool, rpcId, isFinal, payload, nullptr);
     if (!response) return Replace(pool, error, kOutOfMemoryMessage), nullptr;
     response->contentTypeM = contentType;

@@ -5,6 +5,7 @@
 
 #include "sarn/base/Limits.h"
 #include "sarn/rpc/internal/BodyStream.h"
+#include "sarn/rpc/internal/HeaderNames.h"
 
 namespace sarn {
 
@@ -13,6 +14,7 @@ const char KernoRpcV2BytestreamImpl::BodyCompressionFailedMessage[] =
 
 namespace {
 using Keys = RpcV2Parser::HeaderKeys;
+inline const internal::HeaderNames& Names() { return internal::HeaderNames::Get(); }
 }  // namespace
 
 KernoRpcV2BytestreamImpl::KernoRpcV2BytestreamImpl(wynbaselib::Bytesource& source, VekMempool* pool,
@@ -104,7 +106,7 @@ void KernoRpcV2BytestreamImpl::OnParsingComplete() {
 }
 
 void KernoRpcV2BytestreamImpl::GetResponseCountValue(RequestWrapper::ResponseCount& count) {
-  const VekString text = headersM->GetString(Keys::ResponseCount, 0);
+  const VekString text = headersM->GetString(Names().responseCountM, 0);
   if (text.FEqual(RpcV2Parser::ResponseCountValues::None)) {
     count = RequestWrapper::ResponseCountNone;
   } else if (text.FEqual(RpcV2Parser::ResponseCountValues::Single)) {
@@ -136,11 +138,11 @@ bool KernoRpcV2BytestreamImpl::ExtractPayload(KernoVersion version, ref<LazyDict
 }
 
 void KernoRpcV2BytestreamImpl::BuildRpcWrapper(ref<KernoRpcWrapper>& result) {
-  const VekString contentType = headersM->GetString(Keys::ContentType, 0);
-  const VekString type = headersM->GetString(Keys::Type, 0);
-  const unsigned rpcId = Dict::ParseU32(pMempoolM, headersM->GetString(Keys::RpcId, 0).Utf8());
+  const VekString contentType = headersM->GetString(Names().contentTypeM, 0);
+  const VekString type = headersM->GetString(Names().typeM, 0);
+  const unsigned rpcId = Dict::ParseU32(pMempoolM, headersM->GetString(Names().rpcIdM, 0).Utf8());
   const KernoVersion version =
-      static_cast<KernoVersion>(Dict::ParseU32(pMempoolM, headersM->GetString(Keys::SchemaVersion, 0).Utf8()));
+      static_cast<KernoVersion>(Dict::ParseU32(pMempoolM, headersM->GetString(Names().schemaVersionM, 0).Utf8()));
   ref<LazyDict> body;
   if (type.FEqual(RpcV2Parser::TypeValues::Cancel)) {
     result = CancelWrapper::New(pMempoolM, rpcId, nullptr);
@@ -150,7 +152,7 @@ void KernoRpcV2BytestreamImpl::BuildRpcWrapper(ref<KernoRpcWrapper>& result) {
   if (type.FEqual(RpcV2Parser::TypeValues::Request)) {
     RequestWrapper::ResponseCount count;
     GetResponseCountValue(count);
-    ref<RequestWrapper> request = RequestWrapper::New(pMempoolM, rpcId, headersM->GetString(Keys::RequestType, 0),
+    ref<RequestWrapper> request = RequestWrapper::New(pMempoolM, rpcId, headersM->GetString(Names().requestTypeM, 0),
                                                       count, version, body, nullptr);
     if (!request) return;
     request->contentTypeM = contentType;
@@ -158,13 +160,13 @@ void KernoRpcV2BytestreamImpl::BuildRpcWrapper(ref<KernoRpcWrapper>& result) {
     result = request;
   } else if (type.FEqual(RpcV2Parser::TypeValues::RequestUpdate)) {
     ref<RequestUpdateWrapper> update =
-        RequestUpdateWrapper::New(pMempoolM, rpcId, headersM->GetString(Keys::RequestType, 0), body, nullptr);
+        RequestUpdateWrapper::New(pMempoolM, rpcId, headersM->GetString(Names().requestTypeM, 0), body, nullptr);
     if (!update) return;
     update->contentTypeM = contentType;
     update->SetOptionalHeaders(headersM);
     result = update;
   } else {
-    const bool isFinal = headersM->GetString(Keys::IsFinal, 0).FEqual("true");
+    const bool isFinal = headersM->GetString(Names().isFinalM, 0).FEqual("true");
     ref<ResponseWrapper> response = ResponseWrapper::New(pMempoolM, rpcId, isFinal, body, nullptr);
     if (!response) return;
     response->contentTypeM = contentType;
