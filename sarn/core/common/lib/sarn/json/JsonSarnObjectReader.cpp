@@ -174,7 +174,7 @@ struct JsonSarnObject::ReadState {
       pKeysM = keys;
       capKeysM = capacity;
     }
-    std::memcpy(pKeysM + nKeysM, key, n);
+    if (n != 0) std::memcpy(pKeysM + nKeysM, key, n);  // an empty key may come with no bytes at all
     long at = static_cast<long>(nKeysM);
     nKeysM += n;
     return at;
