@@ -172,6 +172,19 @@ void BM_ConverterJsonThroughDictionary(benchmark::State& state) {
   PerJsonByte(state);
 }
 
+void BM_ConverterDirectRead(benchmark::State& state) {
+  Forms& forms = GetForms(static_cast<size_t>(state.range(0)));
+  VekMempool pool("bench-lazy");
+  for (auto _ : state) {
+    VekString error;
+    ref<SarnObject> object;
+    JsonSarnObject(&pool).JsonToSarnObject(forms.jsonBytesM->GetData(), static_cast<int>(forms.jsonBytesM->GetLength()),
+                                           kVersion, &object, error);
+    benchmark::DoNotOptimize(object.Get());
+  }
+  PerJsonByte(state);
+}
+
 void BM_ConverterMarshal(benchmark::State& state) {
   benchbody::Body& body = benchbody::GetBody(static_cast<size_t>(state.range(0)));
   VekMempool pool("bench-lazy");
@@ -288,6 +301,7 @@ BENCHMARK(BM_ProtobufSerialize)->Apply(Sizes);
 BENCHMARK(BM_ConverterUnmarshal)->Apply(Sizes);
 BENCHMARK(BM_ConverterObjectToJson)->Apply(Sizes);
 BENCHMARK(BM_ConverterJsonThroughDictionary)->Apply(Sizes);
+BENCHMARK(BM_ConverterDirectRead)->Apply(Sizes);
 BENCHMARK(BM_ConverterMarshal)->Apply(Sizes);
 BENCHMARK(BM_LazyToSarnObject)->Apply(EveryFormBothWays);
 BENCHMARK(BM_LazyCompactToBuffer)->Apply(EveryForm);

@@ -93,6 +93,14 @@ ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCount
   if (form == "object" || name == "longObject") return LazyDict::FromSarnObject(pool, address, version);
   if (form == "dictionary") return LazyDict::FromDictionary(pool, tree, version);
   if (form == "source" || name == "longSource" || name == "loggedSource") return source(json, true);
+  if (name == "captured") {  // the body of a request read by the direct object reader
+    std::string text = "{\"type\": \"kernoRpcRequest\", \"request\": " + json + "}";
+    ref<SarnObject> request;
+    VekString error;
+    JsonSarnObject(pool).JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
+                                          static_cast<int>(text.size()), 0, &request, error);
+    return static_cast<sarnschema::KernoRpcRequest*>(request.Get())->requestM;
+  }
   if (name == "cutSource") return source("{\"type\": \"address\", \"street1\": \"" + std::string(17000, 's'), true);
   if (name == "badSource") return source("{\"type\": \"address\", x}", true);
   if (name == "noDuplicate") return source("{}", false);

@@ -30,9 +30,15 @@
 //   before and after (in thousands, rounded down) and the elapsed monotonic time.
 // - Nesting: readers never parse a lazy field, so payloads can nest inside one another past every
 //   reader's limit, and converting one converts those inside it. Each conversion that starts while
-//   others are running on the same thread counts one level; past Limits::kDefaultMaxDepth levels
-//   the payload is taken as the "error" object carrying kLazyDictDepthLimitFormat, so that no
-//   input exhausts the native stack.
+//   others are running on the same thread counts one level; past Limits::kDefaultMaxDepth levels,
+//   or once those conversions have taken kLazyNestingStackBytes of native stack (a level may hold
+//   a whole tree written recursively, so levels alone do not bound the stack), the payload is
+//   taken as the "error" object carrying kLazyDictDepthLimitFormat. So no input exhausts the
+//   stack; in an optimised build the stack bound falls first, after about 46 levels of compact
+//   and 94 of pretty JSON. The binary writer converts nested payloads one after another and
+//   passes their levels on, so it stops at the level limit.
+// - JSON output of a bad representation is nothing at all, also inside an object, whose member
+//   then has a name and no value: such a payload cannot be passed on as JSON.
 //
 // Ownership: the payload holds references to its Dict, bytes, object and Dictionary, and owns
 // its byte source (deleted with the payload, once). Results are new objects in the payload's
