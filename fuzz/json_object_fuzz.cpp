@@ -31,25 +31,25 @@ using sarntest::PieceSource;
 using sarntest::Require;
 using sarntest::Str;
 
-struct Outcome {
-  bool isOkM;
-  std::string textM;  // the object written at version 0, or the message
-  ref<SarnObject> objectM;
-};
-
-Outcome FromMemory(VekMempool* pool, JsonSarnObject& reader, const std::string& text) {
-  Outcome out;
+// Reads `text` from memory (piece 0) or from a byte source in pieces; "+" and the object written
+// at version 0, or "!" and the message. The byte source must be left unmoved, its two duplicates
+// deleted.
+std::string Read(VekMempool* pool, JsonSarnObject& reader, const std::string& text, size_t piece,
+                 ref<SarnObject>& object) {
   VekString error;
-  out.isOkM = reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                      static_cast<int>(text.size()), 0, &out.objectM, error);
-  Require(out.isOkM == (out.objectM != nullptr));
-  out.textM = out.isOkM ? Str(JsonSarnObject(pool).SarnObjectToJson(out.objectM.Get(), 0)) : Str(error);
-  return out;
+  PieceSource::Counters counters;
+  PieceSource source(text, piece, &counters);
+  size_t bytesRead = 0;
+  bool isOk = piece == 0 ? reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
+                                                   static_cast<int>(text.size()), 0, &object, error)
+                         : reader.JsonToSarnObject(&source, bytesRead, 0, &object, error);
+  Require(isOk == (object != nullptr) && source.GetPosition() == 0 && bytesRead <= text.size() &&
+          counters.nDuplicatedM == (piece == 0 ? 0 : 2) && counters.nDeletedM == counters.nDuplicatedM);
+  return isOk ? "+" + Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), 0)) : "!" + Str(error);
 }
 
-// True when an object of the tree holds a value of one of the data types in `mask` (bit = code);
-// known dicts and subdicts are searched through.
-bool Holds(const SarnObject* object, uint32_t mask) {
+// True when an object of the tree holds a free-form value, a lazy member or a subdict.
+bool HoldsPathDifference(const SarnObject* object) {
   const StructInfo* info = object->GetStructInfo();
   for (unsigned n = 0; n < info->nFieldInfo; ++n) {
     const FieldInfo& field = info->vFieldInfo[n];
@@ -57,18 +57,13 @@ bool Holds(const SarnObject* object, uint32_t mask) {
     if (field.arity == SARN_ARITY_NONE || (!TraitsOf(type).isHoldingObjects && type != SARN_DATA_TYPE_ANY_DICT)) continue;
     for (unsigned i = 0; i < FieldAccess::Count(object, field); ++i) {
       VekCore* value = FieldAccess::ReferenceAt(object, field, i);
-      if (value == nullptr) continue;
-      if (mask & (1u << type)) return true;
-      if (type != SARN_DATA_TYPE_ANY_DICT && type != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY &&
-          Holds(static_cast<SarnObject*>(value), mask)) {
+      if (value != nullptr && (type != SARN_DATA_TYPE_KNOWN_DICT || HoldsPathDifference(static_cast<SarnObject*>(value)))) {
         return true;
       }
     }
   }
   return false;
 }
-constexpr uint32_t kPathDifferencesG =
-    1u << SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY | 1u << SARN_DATA_TYPE_ANY_DICT | 1u << SARN_DATA_TYPE_SUBDICT;
 
 // True when a dictionary of the tree repeats a name.
 bool RepeatsName(const DictValue* value) {
@@ -102,33 +97,26 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const size_t piece = kPieces[data[0] % 4];
   const std::string text(reinterpret_cast<const char*>(data + 1), size - 1);
   VekMempool pool("fuzz");
-  {
+  [&] {
     JsonSarnObject reader(&pool);
-    Outcome memory = FromMemory(&pool, reader, text);
-
-    PieceSource::Counters counters;
-    PieceSource source(std::make_shared<const std::string>(text), piece, &counters);
-    ref<SarnObject> object;
-    VekString error;
-    size_t bytesRead = 0;
-    bool isOk = reader.JsonToSarnObject(&source, bytesRead, 0, &object, error);
-    Require(isOk == memory.isOkM && counters.nDuplicatedM == 2 && counters.nDeletedM == 2 && source.Position() == 0);
-    Require(bytesRead <= text.size());
-    Require((isOk ? Str(JsonSarnObject(&pool).SarnObjectToJson(object.Get(), 0)) : Str(error)) == memory.textM);
-    if (!isOk) return 0;
-
-    Outcome again = FromMemory(&pool, reader, memory.textM);
-    Require(again.isOkM ? again.textM == memory.textM : RefusedWhenWritten(memory.textM));
+    ref<SarnObject> object, viaSource, again;
+    const std::string memory = Read(&pool, reader, text, 0, object);
+    Require(Read(&pool, reader, text, piece, viaSource) == memory);
+    if (!object) return;
+    const std::string written = memory.substr(1);
+    const std::string second = Read(&pool, reader, written, 0, again);
+    Require(again ? second == memory : RefusedWhenWritten(written));
 
     VekString treeError;
     ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(text.data()), text.size(),
                                                 treeError, &pool);
-    if (!tree) return 0;
+    if (!tree) return;
     DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
     ref<SarnObject> viaTree;
-    if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return 0;
-    if (Holds(memory.objectM.Get(), kPathDifferencesG) || RepeatsName(tree.Get())) return 0;
-    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == memory.textM);
-  }
+    if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return;
+    if (HoldsPathDifference(object.Get()) || RepeatsName(tree.Get())) return;
+    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == written);
+  }();
+  Require(pool.GetUsedBytes() == 0);  // everything a read made is released with its result
   return 0;
 }

@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -86,37 +85,32 @@ class TestSource : public wynbaselib::Bytesource {
   bool isFailingM;
 };
 
-// A source over a shared text that delivers at most `piece` bytes per read. Duplicate gives an
-// independent source at the same position; `counters` (when given) count the duplicates made and
-// the sources deleted, so a test can see that a reader deleted what it asked for.
-class PieceSource : public wynbaselib::Bytesource {
+// An in-memory stream that delivers at most `piece` bytes per read (0: no bound) and counts, in
+// `counters` when given, the duplicates made and the streams deleted, so that a test can see that
+// a reader deleted what it asked for.
+class PieceSource : public wynbaselib::InMemoryBytestream {
  public:
   struct Counters {
     int nDuplicatedM = 0;
     int nDeletedM = 0;
   };
-  PieceSource(std::shared_ptr<const std::string> text, size_t piece, Counters* counters = nullptr, size_t at = 0)
-      : textM(std::move(text)), pieceM(piece), pCountersM(counters), atM(at) {}
+  PieceSource(const std::string& text, size_t piece, Counters* counters = nullptr)
+      : InMemoryBytestream(text), pieceM(piece), pCountersM(counters) {}
+  PieceSource(const PieceSource& other) = default;
   ~PieceSource() override {
     if (pCountersM != nullptr) ++pCountersM->nDeletedM;
   }
   size_t Read(void* buffer, size_t size) override {
-    size_t n = std::min({size, pieceM, textM->size() - atM});
-    std::memcpy(buffer, textM->data() + atM, n);
-    atM += n;
-    return n;
+    return InMemoryBytestream::Read(buffer, pieceM != 0 ? std::min(size, pieceM) : size);
   }
   Bytesource* Duplicate() override {
     if (pCountersM != nullptr) ++pCountersM->nDuplicatedM;
-    return new PieceSource(textM, pieceM, pCountersM, atM);
+    return new PieceSource(*this);
   }
-  size_t Position() const { return atM; }
 
  private:
-  std::shared_ptr<const std::string> textM;
   size_t pieceM;
   Counters* pCountersM;
-  size_t atM;
 };
 
 // A sink that keeps what it is given; with `fFailM` set every write and flush fails.

@@ -24,7 +24,8 @@
 // arrays are flattened, a repeated member is read again (single fields keep the later value,
 // arrays append). Free-form (ANY_DICT) values go through the free-form reader below, where every
 // scalar becomes a string. A lazy member (KNOWN_DICT_AS_LAZY) is not read: its exact bytes from
-// brace to brace are captured into an in-memory byte source held by the payload.
+// brace to brace (across blocks too) are captured through the cursor's echo into an in-memory
+// stream, held by a byte-source payload of version 0 and written again by the payload's writers.
 //
 // Decisions of the reader:
 // - A value starting with '[' for a field that is not multi-valued fails ("Array value given for

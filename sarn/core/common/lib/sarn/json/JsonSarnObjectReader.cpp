@@ -163,10 +163,16 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
     }
     const FieldInfo* field = object ? state->Find(type, key.pM, key.nM) : nullptr;
     bool isType = isFirstPass && key.Is("type", 4);
-    long keyAt = state->PushKey(key.pM, key.nM);
-    if (keyAt < 0) {
-      Append(pool, error, kOutOfMemoryMessage);
-      return false;
+    // The key is kept for the message of a failing value. Bytes in the cursor's block stay where
+    // they are once the source has no more blocks (always, for text in memory); others are copied.
+    const char* keyText = reinterpret_cast<const char*>(key.pM);
+    long keyAt = -1;
+    if (input.fMoreM || key.isHeldM) {
+      keyAt = state->PushKey(key.pM, key.nM);
+      if (keyAt < 0) {
+        Append(pool, error, kOutOfMemoryMessage);
+        return false;
+      }
     }
     size_t keyLength = key.nM;
     if (Take(input) != ':') {
@@ -180,7 +186,7 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
       if (!RecordType(self, input, ordinal, error)) return false;
     } else if (!Value(self, depth + 1, input, field, object.Get(), error)) {
       Append(pool, error, kForKeyG);
-      Append(pool, error, state->pKeysM + keyAt, keyLength);
+      Append(pool, error, keyAt < 0 ? keyText : state->pKeysM + keyAt, keyLength);
       return false;
     }
     state->nKeysM = keysAtStart;
