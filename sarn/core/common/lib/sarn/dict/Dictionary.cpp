@@ -281,27 +281,39 @@ void Dictionary::SortedFirsts(SortKey* out) const {
 }
 
 bool Dictionary::Remove(const VekString& name) {
-  int32_t first = FindFirst(name.Utf8(), name.NByte());
-  if (first < 0) return false;
-  // Rare, so simple: take the survivors out in order and append them again, which rebuilds
-  // the chains and the index for their new positions.
+  if (FindFirst(name.Utf8(), name.NByte()) < 0) return false;
+  // The survivors are moved down in place and linked again in their order, which allocates
+  // nothing: removing a name can never cost another name its values, even without memory.
   uint32_t nOld = nEntryM;
-  Entry* old = vEntryM;
-  vEntryM = nullptr;
-  nEntryM = capacityM = nNameM = indexMaskM = 0;
-  pMempoolM->Free(vIndexM);
-  vIndexM = nullptr;
+  nEntryM = 0;
+  nNameM = 0;
+  if (vIndexM != nullptr) std::memset(vIndexM, 0, (indexMaskM + 1u) * sizeof(int32_t));
   for (uint32_t i = 0; i < nOld; ++i) {
-    Entry& e = old[i];
+    Entry& e = vEntryM[i];
     if (NameIs(e.nameM, name.Utf8(), name.NByte())) {
       TreeRelease::Release(e.pValueM);
-    } else if (!AppendAny(e.nameM, e.pValueM)) {
-      // Only memory exhaustion gets here; the value cannot be kept, so it is released.
-      TreeRelease::Release(e.pValueM);
+      e.~Entry();
+      continue;
     }
-    e.~Entry();
+    int32_t entry = static_cast<int32_t>(nEntryM);
+    if (static_cast<uint32_t>(entry) != i) {
+      new (&vEntryM[entry]) Entry{e.nameM, e.pValueM, -1, entry};
+      e.~Entry();
+    }
+    Entry& kept = vEntryM[entry];
+    kept.nextM = -1;
+    int32_t first = FindFirst(kept.nameM.Utf8(), kept.nameM.NByte());  // among the entries kept so far
+    ++nEntryM;
+    if (first < 0) {
+      kept.lastOrOrdinalM = entry;
+      ++nNameM;
+      if (vIndexM != nullptr) IndexInsert(entry);
+    } else {
+      kept.lastOrOrdinalM = -static_cast<int32_t>(CountOf(first));
+      vEntryM[vEntryM[first].lastOrOrdinalM].nextM = entry;
+      vEntryM[first].lastOrOrdinalM = entry;
+    }
   }
-  pMempoolM->Free(old);
   return true;
 }
 
