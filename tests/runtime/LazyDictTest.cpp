@@ -1,11 +1,15 @@
 // LazyDict: every operation of every form against one table (the byte source read through
 // duplicates, feature 548 and the sink pieces, the log line, equality, and the payload inside an
-// object written as JSON, converted to a Dictionary and marshalled), and nesting past the limit.
+// object written as JSON, converted to a Dictionary and marshalled, and in version-1 envelopes),
+// random envelopes nesting payloads of every form through the binary form, and nesting past the limit.
+#include <functional>
+#include <map>
 #include <memory>
 #include <regex>
 
 #include "runtime/DictTestSupport.h"
 #include "testutil/ObjectFill.h"
+#include "testutil/RandomObject.h"
 
 namespace {
 
@@ -70,9 +74,9 @@ ref<SarnObject> Address(VekMempool* pool, size_t street1 = 0) {
   return address;
 }
 
-// The payloads of the table by name: "<form><version>" for the address in each form, and others.
-ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCounts* counts) {
-  ref<SarnObject> address = Address(pool, name == "longSource" ? 20000 : name == "longObject" ? 40000 : 0);
+// The payloads of the table by name: "<form><version>" for the address (or `object`) in each form, and others.
+ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCounts* counts, ref<SarnObject> object = nullptr) {
+  ref<SarnObject> address = object ? object : Address(pool, name == "longSource" ? 20000 : name == "longObject" ? 40000 : 0);
   if (name.rfind("logged", 0) == 0) {
     address = sarnschema::ChannelMapConfigInstructions::Factory(pool);
     static_cast<sarnschema::ChannelMapConfigInstructions*>(address.Get())->hostNameM = "host";
@@ -236,6 +240,20 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
            (payload->dictionaryM ? ", tree" : "") + ", duplicates " + std::to_string(counts.duplicatesM) +
            ", deleted " + std::to_string(counts.deletedM);
   }
+  ProtoBuf codec(pool, Schema::vStructDefG, Schema::nStructDefG);
+  if (op.rfind("wrapper", 0) == 0) {  // the body of a version-1 envelope: its bytes | what the envelope reader reads
+    ref<SarnObject> envelope = StructInfoForId(std::stoul(op.substr(7)))->pFactory(pool), back, object;
+    const FieldInfo& body = envelope->GetStructInfo()->vFieldInfo[2];  // in each of the three
+    FieldAccess::PutReference(envelope.Get(), body, payload.Get());
+    std::string bytes = BinaryOf(pool, envelope.Get());
+    ref<SarnObject> read = codec.UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
+    // As a known dict the body stays unparsed bytes that convert to the payload's object.
+    EXPECT_TRUE(codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &back));
+    auto* unparsed = static_cast<LazyDict*>(FieldAccess::ReferenceAt(back.Get(), body, 0));
+    EXPECT_TRUE(unparsed->repM == LazyDict::REP_PROTOBUF && *unparsed->ToSarnObjectOrError() == *payload->ToSarnObjectOrError());
+    EXPECT_TRUE(!payload->ToSarnObject(object) || (*back == *envelope && *envelope == *back));
+    return Hex(bytes) + " | " + (BinaryOf(pool, read.Get()) == bytes ? "same" : ObjectJson(pool, read));
+  }
   // The payload in a request: written as JSON; converted to a Dictionary (the payload shared)
   // and back; marshalled and read back, the payload then unparsed bytes converted to an object.
   ref<SarnObject> request = InRequest(pool, payload);
@@ -250,8 +268,7 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
   }
   ref<SarnObject> back;
   std::string binary = BinaryOf(pool, request.Get());
-  EXPECT_TRUE(ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG)
-                  .UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(binary.data()), static_cast<int>(binary.size()), &back));
+  EXPECT_TRUE(codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(binary.data()), static_cast<int>(binary.size()), &back));
   const ref<LazyDict>& read = static_cast<sarnschema::KernoRpcRequest*>(back.Get())->requestM;
   EXPECT_EQ(read->repM, LazyDict::REP_PROTOBUF);
   return ObjectJson(pool, read->ToSarnObjectOrError());
@@ -278,6 +295,50 @@ TEST_F(LazyDictTest, EveryOperationOfEveryForm) {
     }
     EXPECT_EQ(counts.deletedM, counts.duplicatesM + (row[0].find("ource") != std::string::npos || row[0] == "noDuplicate"));
   }
+}
+
+// Random envelopes (their bodies success, cancel or envelopes again), every payload replaced, the
+// innermost first, by the next form holding its object: marshalled and read back they are equal,
+// write the same bytes again, and each payload is unparsed bytes converting to its object.
+TEST_F(LazyDictTest, RandomEnvelopesWithPayloadsInEveryFormTravelUnparsed) {
+  sarntest::RandomObjects random(&poolM, 615, {543, 974, 975, 976, 2238}, 3, false);
+  random.isWithControlsM = false;
+  SourceCounts counts;
+  std::map<const LazyDict*, ref<SarnObject>> madeFrom;
+  int nextForm = 0;
+  // Of these types the three envelopes hold a payload, each as field 2 (null past the depth).
+  auto body = [](SarnObject* o) -> const FieldInfo* {
+    const FieldInfo* field = o->GetTypeId() >= 975 ? &o->GetStructInfo()->vFieldInfo[2] : nullptr;
+    return field && FieldAccess::ReferenceAt(o, *field, 0) ? field : nullptr;
+  };
+  auto lazy = [&](SarnObject* o) { return static_cast<LazyDict*>(FieldAccess::ReferenceAt(o, *body(o), 0)); };
+  std::function<void(SarnObject*)> reform = [&](SarnObject* o) {
+    if (!body(o)) return;
+    ref<SarnObject> inner = lazy(o)->ToSarnObjectOrError();
+    reform(inner.Get());
+    static const char* const kForms[] = {"dict0", "json0", "pb0", "object0", "dictionary0", "source0"};
+    ref<LazyDict> payload = MakePayload(&poolM, kForms[nextForm++ % 6], &counts, inner);
+    madeFrom[payload.Get()] = inner;
+    FieldAccess::PutReference(o, *body(o), payload.Get());
+  };
+  std::function<void(SarnObject*, SarnObject*)> expectUnparsed = [&](SarnObject* made, SarnObject* read) {
+    if (!body(made)) return;
+    ASSERT_EQ(lazy(read)->repM, LazyDict::REP_PROTOBUF);
+    ref<SarnObject> object = lazy(read)->ToSarnObjectOrError(), source = madeFrom.at(lazy(made));
+    ASSERT_TRUE(*object == *source) << Str(source->ToString(false, 0));
+    expectUnparsed(source.Get(), object.Get());
+  };
+  for (int i = 0; i < 300 && !HasFatalFailure(); ++i) {
+    ref<SarnObject> object = random.Make(i % 3 == 2 ? 2238 : 975 + i % 3);
+    reform(object.Get());
+    std::string bytes = BinaryOf(&poolM, object.Get());
+    ref<SarnObject> back;
+    ASSERT_TRUE(ProtoBuf(&poolM, Schema::vStructDefG, Schema::nStructDefG).UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &back));
+    EXPECT_TRUE(*back == *object && *object == *back) << i;
+    EXPECT_EQ(BinaryOf(&poolM, back.Get()), bytes) << i;
+    expectUnparsed(object.Get(), back.Get());
+  }
+  EXPECT_GT(nextForm, 600);
 }
 
 TEST_F(LazyDictTest, FirstByteChoosesTheForm) {

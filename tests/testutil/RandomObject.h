@@ -25,6 +25,10 @@ class RandomObjects {
                 bool isWithBytes = true)
       : pPoolM(pool), stateM(seed), knownTypesM(std::move(knownTypes)), maxDepthM(maxDepth), isWithBytesM(isWithBytes) {}
 
+  // False: strings hold no control characters, whose escapes one JSON reader decodes and the
+  // other keeps as text, so that an object reads back alike through both.
+  bool isWithControlsM = true;
+
   ref<sarn::SarnObject> Make(unsigned typeId) { return Make(typeId, maxDepthM); }
   ref<sarn::SarnObject> MakeKnown() { return Make(knownTypesM[Next(knownTypesM.size())], maxDepthM); }
 
@@ -128,7 +132,10 @@ class RandomObjects {
     static const char* const kPieces[] = {"a", "Z", "7", " ", "\"", "\\", "/", "\t", "\n", "\x01", "\xC3\xA9",
                                           "\xE2\x82\xAC", "\xF0\x9F\x98\x80", "~"};
     std::string text;
-    for (uint64_t n = Next(13); n > 0; --n) text += kPieces[Next(sizeof kPieces / sizeof kPieces[0])];
+    for (uint64_t n = Next(13); n > 0; --n) {
+      const char* piece = kPieces[Next(sizeof kPieces / sizeof kPieces[0])];
+      text += isWithControlsM || static_cast<unsigned char>(piece[0]) >= 0x20 ? piece : "~";
+    }
     return text;
   }
 

@@ -14,6 +14,7 @@
 #include "sarn/dict/Dictionary.h"
 #include "sarn/values/Json.h"
 #include "sarn/dict/LazyDict.h"
+#include "sarn/dict/internal/LazyDictSupport.h"
 #include "sarn/dict/internal/TreeWalk.h"
 
 namespace sarn {
@@ -39,6 +40,11 @@ struct BufferOut {
   void Put(char c) { bufferM.AppendByte(static_cast<unsigned char>(c)); }
   void Text(const VekString& text, bool fBareAllowed) { Json::StringToJson(text, fBareAllowed, bufferM); }
   void Lazy(const LazyDict& payload, bool pretty) { payload.ToJsonByteBuffer(bufferM, pretty); }
+};
+
+// Payloads inside are written as their trees, whatever form holds them, for comparisons.
+struct ComparableOut : BufferOut {
+  void Lazy(const LazyDict& payload, bool) { internal::WriteComparableJson(payload, bufferM); }
 };
 
 struct SinkOut {
@@ -204,6 +210,11 @@ bool TreeWalk::Equal(const DictValue& a, const DictValue* b) {
 void TreeWalk::Write(const DictValue& value, ByteBuffer& out, JsonFormat format) {
   BufferOut adaptor{out};
   TreeWriter::Value(value, adaptor, format);
+}
+
+void TreeWalk::WriteComparable(const DictValue& value, ByteBuffer& out) {
+  ComparableOut adaptor{{out}};
+  TreeWriter::Value(value, adaptor, JsonFormat(false));
 }
 
 void TreeWalk::Write(const DictValue& value, wynbaselib::Bytesink& out, JsonFormat format) {

@@ -113,6 +113,31 @@ ref<Dictionary> TreeOf(const LazyDict& payload, const LazyForm& form, VekString&
 
 using internal::FormOf;
 using internal::LazyForm;
+namespace internal {
+
+ref<Dict> DictOf(const LazyDict& payload, const LazyForm& form) {
+  if (form.repM == LazyDict::REP_DICT) return payload.dictM;
+  VekMempool* pool = payload.GetMempool();
+  VekString error;
+  ref<Dictionary> tree = TreeOf(payload, form, error, true);
+  if (tree) return MempoolNew<Dict>(pool, tree);
+  if (form.repM != kBadRep) return ref<Dict>();  // out of memory
+  ref<Dict> bad = Dict::New(pool, VekString("error"));
+  if (!bad || !bad->AddString("code", "internalError") || !bad->AddString("text", "bad rep in LazyDict")) {
+    return ref<Dict>();
+  }
+  return bad;
+}
+
+void WriteComparableJson(const LazyDict& payload, ByteBuffer& out) {
+  LazyNesting nesting;  // held while the payloads inside are written, so that they count
+  ref<Dict> dict = DictOf(payload, FormOf(payload, nesting));
+  if (!dict) return out.Fail();
+  TreeWalk::WriteComparable(*dict->GetDictionary(), out);
+}
+
+}  // namespace internal
+
 using internal::LazyNesting;
 
 namespace {
@@ -310,17 +335,7 @@ ref<Dictionary> LazyDict::ToDictionary(VekString& error) const {
 
 ref<Dict> LazyDict::ToDict() const {
   LazyNesting nesting;
-  LazyForm form = FormOf(*this, nesting);
-  if (form.repM == REP_DICT) return dictM;
-  VekString error;
-  ref<Dictionary> tree = internal::TreeOf(*this, form, error, true);
-  if (tree) return MempoolNew<Dict>(pMempoolM, tree);
-  if (form.repM != internal::kBadRep) return ref<Dict>();  // out of memory
-  ref<Dict> bad = Dict::New(pMempoolM, VekString("error"));
-  if (!bad || !bad->AddString("code", "internalError") || !bad->AddString("text", "bad rep in LazyDict")) {
-    return ref<Dict>();
-  }
-  return bad;
+  return internal::DictOf(*this, FormOf(*this, nesting));
 }
 
 template <class Out>
@@ -387,9 +402,11 @@ VekString LazyDict::ToJson(bool pretty) const {
 }
 
 bool LazyDict::operator==(const LazyDict& other) const {
-  ref<Dict> mine = ToDict();
-  ref<Dict> theirs = other.ToDict();
-  return mine && theirs && *mine == *theirs;
+  ByteBuffer mine(pMempoolM), theirs(pMempoolM);
+  internal::WriteComparableJson(*this, mine);
+  internal::WriteComparableJson(other, theirs);
+  return !mine.HasFailed() && !theirs.HasFailed() && mine.GetLength() == theirs.GetLength() &&
+         (mine.GetLength() == 0 || std::memcmp(mine.GetData(), theirs.GetData(), mine.GetLength()) == 0);
 }
 
 }  // namespace sarn

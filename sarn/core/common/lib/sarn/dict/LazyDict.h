@@ -146,7 +146,11 @@ class SARN_EXPORT LazyDict : public VekCore {
   // payload becomes REP_DICTIONARY and the source is deleted, on failure both stay.
   void BuildDictionaryFromBytesource();
 
-  // Equal compact JSON texts of the two payloads' ToDict(); false when either cannot be made.
+  // Equal compact JSON texts of the two payloads' ToDict(), in which every payload inside is
+  // written as its own ToDict() tree in the same way rather than by its form's writer (an
+  // object's writer keeps field order, a tree's sorts names, stored JSON is as it came), so that
+  // payloads holding the same object are equal whichever forms hold the payloads nested in
+  // them; a bare number still differs from a quoted one. False when either cannot be made.
   bool operator==(const LazyDict& other) const;
   bool operator!=(const LazyDict& other) const { return !(*this == other); }
 

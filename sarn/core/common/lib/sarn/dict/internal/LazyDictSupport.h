@@ -67,6 +67,13 @@ ref<Dictionary> JsonToDictionaryOrError(const LazyDict& payload);
 // give their own tree.
 ref<Dictionary> TreeOf(const LazyDict& payload, const LazyForm& form, VekString& error, bool isErrorTree);
 
+// ToDict() of the payload in the given form.
+ref<Dict> DictOf(const LazyDict& payload, const LazyForm& form);
+// What equality compares: the compact JSON of the payload's ToDict() tree, with every payload
+// inside it written the same way (its tree, not its own form's text), within one nesting level
+// per payload. The buffer fails when memory runs out.
+void WriteComparableJson(const LazyDict& payload, ByteBuffer& out);
+
 // Stored protocol-buffer bytes as an object; the "error" object "protobuf did not unmarshal"
 // when they do not read. Null only when memory runs out.
 ref<SarnObject> ProtobufToObject(const LazyDict& payload);

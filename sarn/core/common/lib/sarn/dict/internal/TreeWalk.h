@@ -38,6 +38,8 @@ class TreeWalk {
   static bool Equal(const DictValue& a, const DictValue* b);
   static void Write(const DictValue& value, ByteBuffer& out, JsonFormat format);
   static void Write(const DictValue& value, wynbaselib::Bytesink& out, JsonFormat format);
+  // Compact, with each payload inside written by WriteComparableJson (LazyDictSupport.h).
+  static void WriteComparable(const DictValue& value, ByteBuffer& out);
 };
 
 }  // namespace internal
