@@ -69,7 +69,7 @@ TEST_F(JsonParserTest, SyntaxOnlyParseBuildsNothing) {
 }
 
 TEST_F(JsonParserTest, BoundsTheNestingDepth) {
-  // A tree at the limit is read in a small stack with the hand-written reader's tests.
+  // A parse at the limit in a small stack runs with the hand-written reader's depth cases.
   std::string error;
   bool isOk;
   ref<Dictionary> partial = Parse(&poolM, {Nested(JsonLimits::kDefaultMaxDepth + 1)}, &isOk, &error);
