@@ -77,7 +77,7 @@ TEST_F(DictValueTest, RepeatedNamesKeepEveryValueInOrder) {
   range.Add(one);  // GetRange appends, it does not clear
   d->GetRange(VekString("x"), range);
   ASSERT_EQ(range.Count(), 4);
-  EXPECT_EQ(Compact(range.Get(3)), "\"three\"");
+  EXPECT_EQ(Compact(range[3]), "\"three\"");
   VekStringArray texts(&poolM);
   d->GetStringRange(VekString("y"), texts);
   EXPECT_EQ(texts.Count(), 0);
