@@ -400,6 +400,8 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
   const unsigned char* p = token.pM;
   size_t n = token.nM;
   auto text = [&]() { return internal::TokenString(pool, token, hold); };
+  const char* chars = reinterpret_cast<const char*>(p);
+  const VekString* held = token.isHeldM ? &hold : nullptr;
   bool isNegative;
   unsigned long long digits;
   switch (field.dataType) {
@@ -468,23 +470,27 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       }
       return false;
     }
-    case SARN_DATA_TYPE_STRING:
-      return Store(self, FieldAccess::PutString(object, field, text()), field, object, error);
+    case SARN_DATA_TYPE_STRING: {
+      VekString value = text();
+      return Store(self, FieldAccess::PutString(object, field, static_cast<VekString&&>(value)), field, object, error);
+    }
     case SARN_DATA_TYPE_STRING_ID: {
+      // Ids are converted from the token's bytes in place (the held token as the string it is).
       VekString value, inner;
-      if (!DictionarySarnObject::StringToStringId(pool, &field, text(), inner, value)) return false;
-      return Store(self, FieldAccess::PutString(object, field, value), field, object, error);
+      if (!DictionarySarnObject::StringToStringId(pool, &field, chars, n, inner, value, held)) return false;
+      return Store(self, FieldAccess::PutString(object, field, static_cast<VekString&&>(value)), field, object,
+                   error);
     }
     case SARN_DATA_TYPE_INT_ID: {
       unsigned int value;
       VekString inner;
-      if (!DictionarySarnObject::StringToIntId(pool, &field, text(), inner, value)) return false;
+      if (!DictionarySarnObject::StringToIntId(pool, &field, chars, n, inner, value, held)) return false;
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_LONG_ID: {
       unsigned long long value;
       VekString inner;
-      if (!DictionarySarnObject::StringToLongId(pool, &field, text(), inner, value)) return false;
+      if (!DictionarySarnObject::StringToLongId(pool, &field, chars, n, inner, value, held)) return false;
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_BYTESTRING: {
@@ -503,15 +509,15 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_DATE: {
-      Date value = Date::Parse(text());
+      Date value = Date::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_DATETIME: {
-      DateTime value = DateTime::Parse(text());
+      DateTime value = DateTime::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_TIME: {
-      Time value = Time::Parse(text());
+      Time value = Time::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     default:

@@ -17,6 +17,12 @@ bool FieldAccess::PutString(SarnObject* object, const FieldInfo& field, const Ve
   return true;
 }
 
+bool FieldAccess::PutString(SarnObject* object, const FieldInfo& field, VekString&& value) {
+  if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekStringArray>(object, field).Add(value);
+  FieldRef<VekString>(object, field) = static_cast<VekString&&>(value);
+  return true;
+}
+
 bool FieldAccess::PutReference(SarnObject* object, const FieldInfo& field, VekCore* value) {
   if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekGenericArray>(object, field).Add(value);
   // The member is a ref<T> of some VekCore class: one pointer whose bits are the VekCore pointer.

@@ -217,6 +217,9 @@ class SARN_EXPORT FieldAccess {
   // (65,535 elements) or out of memory; nothing changes then.
   static bool PutScalar(SarnObject* object, const FieldInfo& field, const void* value);
   static bool PutString(SarnObject* object, const FieldInfo& field, const VekString& value);
+  // The same, taking the string over where it can (a single field): a reader's fresh string is
+  // stored without a second reference.
+  static bool PutString(SarnObject* object, const FieldInfo& field, VekString&& value);
   static bool PutReference(SarnObject* object, const FieldInfo& field, VekCore* value);
 };
 
