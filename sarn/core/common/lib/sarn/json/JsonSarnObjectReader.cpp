@@ -184,7 +184,7 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
     }
     if (isType) {
       if (!RecordType(self, input, ordinal, error)) return false;
-    } else if (!Value(self, depth + 1, input, field, object.Get(), error)) {
+    } else if (!Member(self, depth + 1, input, field, object.Get(), error)) {
       Append(pool, error, kForKeyG);
       Append(pool, error, keyAt < 0 ? keyText : state->pKeysM + keyAt, keyLength);
       return false;
@@ -199,6 +199,28 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
   }
   if (result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
   return true;
+}
+
+// Value, with the most common members (a scalar into a single field, or a token skipped) read
+// without its two calls; verdicts and messages are Value's.
+inline bool JsonSarnObject::Reader::Member(JsonSarnObject& self, int depth, InputPointerBytesource& input,
+                                           const FieldInfo* field, SarnObject* object, VekString& error) {
+  char c = SkipPeek(input);
+  if (c != '[' && c != '{') {
+    bool isRead;
+    if (field == nullptr) {
+      isRead = SkipToken(input);
+    } else if (field->arity != SARN_ARITY_MULTI && field->dataType != SARN_DATA_TYPE_KNOWN_DICT &&
+               field->dataType != SARN_DATA_TYPE_SUBDICT && field->dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY &&
+               field->dataType != SARN_DATA_TYPE_ANY_DICT) {
+      isRead = Scalar(self, input, *field, object, error);
+    } else {
+      return Value(self, depth, input, field, object, error);
+    }
+    if (!isRead) Append(self.pMempoolM, error, kSingleFailedG);
+    return isRead;
+  }
+  return Value(self, depth, input, field, object, error);
 }
 
 bool JsonSarnObject::Reader::Value(JsonSarnObject& self, int depth, InputPointerBytesource& input,
@@ -462,7 +484,9 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       if (def == nullptr || std::memchr(p, 0, n) != nullptr) return false;
       for (uint64_t i = 0; i < def->nValue; ++i) {
         const char* name = def->vName[i];
-        if (name == nullptr || std::strncmp(name, reinterpret_cast<const char*>(p), n) != 0 || name[n] != '\0') {
+        // (The first byte rejects most names without a call; an empty token matches only "".)
+        if (name == nullptr || (n != 0 && name[0] != static_cast<char>(p[0])) ||
+            std::strncmp(name, reinterpret_cast<const char*>(p), n) != 0 || name[n] != '\0') {
           continue;
         }
         uint32_t value = static_cast<uint32_t>(i);

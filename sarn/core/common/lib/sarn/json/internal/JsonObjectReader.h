@@ -175,6 +175,8 @@ class __attribute__((visibility("hidden"))) JsonSarnObject::Reader {
   // One value of a field that holds no objects, converted and stored (a single field) or appended.
   static bool Scalar(JsonSarnObject& self, InputPointerBytesource& input, const FieldInfo& field, SarnObject* object,
                      VekString& error);
+  static bool Member(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
+                     SarnObject* object, VekString& error);
   static bool Store(JsonSarnObject& self, bool isStored, const FieldInfo& field, SarnObject* object,
                     VekString& error);
   static bool Nested(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo& field,
