@@ -15,13 +15,7 @@
 namespace {
 
 using sarntest::Require;
-
-std::string Varint(uint64_t value) {
-  std::string out;
-  for (; value >= 0x80; value >>= 7) out.push_back(static_cast<char>((value & 0x7F) | 0x80));
-  out.push_back(static_cast<char>(value));
-  return out;
-}
+using sarntest::Varint;
 
 // Encodes a balanced operation list in two linear passes (lengths of the sections from the inside
 // out, then the bytes), without recursion, so the oracle itself copes with the deepest nesting

@@ -11,8 +11,11 @@
 
 #include "vek/VekMempool.h"
 #include "wynbaselib/Gzip.h"
+#include "../tests/testutil/TestStreams.h"
 
 namespace {
+
+using sarntest::Require;
 
 constexpr size_t kMaxOutput = 256 << 10;  // a small input may inflate enormously: stop there
 constexpr size_t kLargeRead = 64 << 10;
@@ -35,14 +38,6 @@ void ReadRest(wynbaselib::Bytesource& source, size_t block, Outcome& out) {
   out.errorM = source.GetErrorText();
 }
 
-#define CHECK(condition)                                           \
-  do {                                                             \
-    if (!(condition)) {                                            \
-      std::fprintf(stderr, "gunzip_fuzz: %s failed\n", #condition); \
-      std::abort();                                                \
-    }                                                              \
-  } while (0)
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
@@ -64,7 +59,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     size_t n = chunked.Read(&first[0], block);
     small.textM.assign(first, 0, n);
     std::unique_ptr<wynbaselib::Bytesource> duplicate(chunked.Duplicate());
-    CHECK(duplicate != nullptr);
+    Require(duplicate != nullptr);
     Outcome fromDuplicate;
     fromDuplicate.textM = small.textM;
     ReadRest(*duplicate, block, fromDuplicate);
@@ -72,15 +67,15 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
 
     // Outputs capped at kMaxOutput may stop at different points; compare what both have.
     size_t common = std::min(big.textM.size(), small.textM.size());
-    CHECK(big.textM.compare(0, common, small.textM, 0, common) == 0);
-    CHECK(small.textM == fromDuplicate.textM);
+    Require(big.textM.compare(0, common, small.textM, 0, common) == 0);
+    Require(small.textM == fromDuplicate.textM);
     if (big.textM.size() < kMaxOutput && small.textM.size() < kMaxOutput) {
-      CHECK(big.textM == small.textM);
-      CHECK(big.isErrorM == small.isErrorM && big.errorM == small.errorM);
-      CHECK(small.isErrorM == fromDuplicate.isErrorM);
-      CHECK(big.isErrorM == !big.errorM.empty());
+      Require(big.textM == small.textM);
+      Require(big.isErrorM == small.isErrorM && big.errorM == small.errorM);
+      Require(small.isErrorM == fromDuplicate.isErrorM);
+      Require(big.isErrorM == !big.errorM.empty());
     }
   }
-  CHECK(pool.GetUsedBytes() == 0 && pool.GetLiveBlocks() == 0);
+  Require(pool.GetUsedBytes() == 0 && pool.GetLiveBlocks() == 0);
   return 0;
 }

@@ -35,7 +35,7 @@ const std::vector<const StructInfo*>& KnownTypes() {
   return types;
 }
 
-std::string Text(const VekString& s) { return std::string(s.Utf8(), s.NByte()); }
+using sarntest::Str;
 
 bool HoldsUnnamedValue(const std::string& json) {
   return json.find("\"INVALID_VALUE:") != std::string::npos || json.find("\"XXX\"") != std::string::npos;
@@ -72,21 +72,21 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     ref<SarnObject> object;
     if (converter.DictionaryToSarnObject(tree, version, object, error)) {
       JsonSarnObject json(&pool);
-      std::string text = Text(json.SarnObjectToJson(object.Get(), version));
+      std::string text = Str(json.SarnObjectToJson(object.Get(), version));
       ref<SarnObject> again = Read(&pool, text, 0);
       if (again == nullptr) return 0;
-      std::string second = Text(json.SarnObjectToJson(again.Get(), version));
+      std::string second = Str(json.SarnObjectToJson(again.Get(), version));
       if (second != text) {
         Require(text.find("\\u00") != std::string::npos);
         ref<SarnObject> third = Read(&pool, second, 0);
-        Require(third != nullptr && Text(json.SarnObjectToJson(third.Get(), version)) == second);
+        Require(third != nullptr && Str(json.SarnObjectToJson(third.Get(), version)) == second);
         return 0;
       }
 
       ref<Dictionary> back = converter.SarnObjectToDictionary(object.Get(), 0);
       ref<SarnObject> fromTree;
       Require(converter.DictionaryToSarnObject(back, 0, fromTree, error));
-      Require(Text(json.SarnObjectToJson(fromTree.Get(), version)) == text);
+      Require(Str(json.SarnObjectToJson(fromTree.Get(), version)) == text);
     }
   }
   return 0;

@@ -92,24 +92,4 @@ TEST_F(ArrayTest, IntArrayCopiesElementsOfEachWidth) {
   EXPECT_EQ(VekGenericIntArray(4, nullptr, 0).GetMempool(), VekMempool::Default());
 }
 
-TEST_F(ArrayTest, TypedArrayOnTheStackAndWithNew) {
-  ref<Item> a = new (&poolM) Item(10);
-  VekArray<Item> onStack(&poolM);
-  EXPECT_TRUE(onStack.Add(a));
-  EXPECT_TRUE(onStack.Add(new (&poolM) Item(11)));  // the array holds the only reference
-  EXPECT_EQ(onStack.Count(), 2);
-  EXPECT_EQ(onStack[1]->idM, 11);
-  EXPECT_EQ(onStack.Get(0), a.Get());
-  auto* onHeap = new VekArray<Item>(&poolM);
-  EXPECT_TRUE(onHeap->Add(a));
-  EXPECT_EQ(a->GetRefCount(), 3u);
-  EXPECT_TRUE(onHeap->Remove(a.Get()));
-  EXPECT_FALSE(onHeap->Remove(a.Get()));
-  delete onHeap;
-  EXPECT_TRUE(onStack.RemoveAt(1));
-  EXPECT_EQ(onStack.Count(), 1);
-  onStack.Clear();
-  EXPECT_EQ(a->GetRefCount(), 1u);
-}
-
 }  // namespace

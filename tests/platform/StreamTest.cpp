@@ -1,5 +1,5 @@
 // Byte sources and sinks: in-memory streams sharing one content, duplicates that leave the
-// original alone, counting, file descriptors, and a caller's own minimal source.
+// original alone, counting and file descriptors.
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -76,27 +76,6 @@ TEST(StreamTest, FileDescriptorSourceAndSink) {
   EXPECT_TRUE(closed.FError() && std::string(closed.GetErrorText()) == "read error");
   wynbaselib::FdBytesink broken(-1);
   EXPECT_FALSE(broken.Write("x", 1));
-}
-
-// A caller's source needs only the two pure virtual functions.
-class CountdownSource : public Bytesource {
- public:
-  explicit CountdownSource(int n) : nM(n) {}
-  size_t Read(void* buffer, size_t size) override {
-    if (nM == 0 || size == 0) return 0;
-    static_cast<char*>(buffer)[0] = static_cast<char>('0' + --nM);
-    return 1;
-  }
-  Bytesource* Duplicate() override { return new CountdownSource(nM); }
-
- private:
-  int nM;
-};
-
-TEST(StreamTest, MinimalUserSourceGetsDefaultErrorQueries) {
-  CountdownSource source(3);
-  EXPECT_EQ(ReadAll(source, 4), "210");
-  EXPECT_TRUE(!source.FError() && std::string(source.GetErrorText()).empty());
 }
 
 }  // namespace

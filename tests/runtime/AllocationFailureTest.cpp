@@ -9,15 +9,15 @@
 #include "wynbaselib/Gzip.h"
 #include "testutil/AllocationFailure.h"
 #include "testutil/ObjectFill.h"
+#include "testutil/TestStreams.h"
 
 using namespace sarn;
 using sarntest::Outcome;
+using sarntest::Str;
 
 namespace {
 
 constexpr unsigned kTestAllTypes = 1259;
-
-std::string Text(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
 
 std::string CompactJson(const DictValue& value) {
   ByteBuffer out(value.GetMempool());
@@ -26,7 +26,7 @@ std::string CompactJson(const DictValue& value) {
 }
 
 std::string ObjectJson(const SarnObject* object) {
-  return Text(JsonSarnObject(object->GetMempool()).SarnObjectToJson(object, 0));
+  return Str(JsonSarnObject(object->GetMempool()).SarnObjectToJson(object, 0));
 }
 
 // The inputs every row reads: one object with every field set, and its other forms. They live in
@@ -49,10 +49,7 @@ struct Inputs {
                       .SarnObjectToDictionary(objectM.Get(), 0);
     ProtoBufByteOutputStream out;
     ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG).Marshal(objectM.Get(), &out);
-    const unsigned char* data;
-    unsigned long length;
-    out.Finish(data, length);
-    protoM.assign(reinterpret_cast<const char*>(data), length);
+    protoM = sarntest::Finished(out);
   }
   ref<SarnObject> objectM;
   std::string jsonM;
@@ -75,7 +72,7 @@ const Row kRowsG[] = {
        ref<Dictionary> dictionary = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(in.jsonM.data()),
                                                          in.jsonM.size(), error, pool);
        endOfRun();
-       return dictionary ? Outcome{true, CompactJson(*dictionary)} : Outcome{false, Text(error)};
+       return dictionary ? Outcome{true, CompactJson(*dictionary)} : Outcome{false, Str(error)};
      }},
     {"streaming parser, in two chunks", kOutOfMemoryMessage,
      [](VekMempool* pool, const Inputs& in, const std::function<void()>& endOfRun) {
@@ -102,13 +99,13 @@ const Row kRowsG[] = {
        bool isOk = DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG)
                        .DictionaryToSarnObject(in.dictionaryM, 0, object, error);
        endOfRun();
-       return isOk ? Outcome{true, ObjectJson(object.Get())} : Outcome{false, Text(error)};
+       return isOk ? Outcome{true, ObjectJson(object.Get())} : Outcome{false, Str(error)};
      }},
     {"JSON writer of objects", "empty",
      [](VekMempool* pool, const Inputs& in, const std::function<void()>& endOfRun) {
        VekString json = JsonSarnObject(pool).SarnObjectToJson(in.objectM.Get(), 0);
        endOfRun();
-       return json.FEmpty() ? Outcome{false, "empty"} : Outcome{true, Text(json)};
+       return json.FEmpty() ? Outcome{false, "empty"} : Outcome{true, Str(json)};
      }},
     {"compact Dictionary writer", "failed",
      [](VekMempool* pool, const Inputs& in, const std::function<void()>& endOfRun) {

@@ -15,13 +15,6 @@ using sarntest::Finished;
 
 namespace {
 
-// The varint of a section length, as Finish writes it.
-std::string Length(size_t n) {
-  std::string bytes;
-  for (; n >= 0x80; n >>= 7) bytes.push_back(static_cast<char>((n & 0x7F) | 0x80));
-  return bytes + static_cast<char>(n);
-}
-
 std::string Written(const std::function<void(ProtoBufByteOutputStream*)>& write) {
   ProtoBufByteOutputStream stream;
   write(&stream);
@@ -99,7 +92,7 @@ TEST(ProtoBufByteOutputStreamTest, FinishResolvesSectionsAndEscapes) {
   for (const Case& c : cases) EXPECT_EQ(FinishedScript(c.script), c.bytes) << c.script;
   // Lengths at the varint's byte boundaries, and sections nested a thousand deep.
   for (size_t n : {size_t{127}, size_t{128}, size_t{16383}, size_t{16384}, size_t{1} << 21}) {
-    EXPECT_EQ(FinishedScript("[" + std::string(n, 'x') + "]"), Length(n) + std::string(n, 'd')) << n;
+    EXPECT_EQ(FinishedScript("[" + std::string(n, 'x') + "]"), sarntest::Varint(n) + std::string(n, 'd')) << n;
   }
   std::string deep = FinishedScript(std::string(1000, '[') + "x" + std::string(1000, ']'));
   ASSERT_EQ(deep.size(), 1u + 127 + 873 * 2);  // the 127 innermost lengths take one byte, the rest two

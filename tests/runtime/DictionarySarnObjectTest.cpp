@@ -115,6 +115,33 @@ TEST_F(DictionaryObjectTest, ScalarFailuresReplaceEarlierTextAndOthersAppend) {
   VekString error;
   EXPECT_FALSE(DictionarySarnObject::StringToIntId(&poolM, &noTarget, VekString("vask:rc.5"), error, id));
   EXPECT_EQ(Str(error) + " " + std::to_string(id), "no struct for idbad prefix: vask:rc.5 99");
+
+  // The byte forms give the string forms' values and messages, reading only their n bytes (a
+  // digit follows them here) and, like the string forms, numbers only up to a NUL.
+  using D = DictionarySarnObject;
+  const std::string nul(1, '\0');
+  const FieldInfo* ids[3] = {};  // the first int, long and string id fields
+  for (const FieldInfo& field : sarnschema::TestAllTypes::vFieldInfoG) {
+    int k = field.dataType == SARN_DATA_TYPE_INT_ID ? 0 : field.dataType == SARN_DATA_TYPE_LONG_ID ? 1 : 2;
+    if (ids[k] == nullptr && (k != 2 || field.dataType == SARN_DATA_TYPE_STRING_ID)) ids[k] = &field;
+  }
+  for (std::string text : std::vector<std::string>{"vask:rc.17", "vask:rc.17" + nul + "9", "vask:r", "", "vask:of.x1",
+                                                  "vask:ct.tms.ep.12", "vask:rc." + std::string(70, '1'),
+                                                  "vask:ct.tms.ep.1" + nul + "2"}) {
+    VekString whole = VekString::FromUtf8Bytes(&poolM, text.size(), text.data()), errors[6], strings[2];
+    const char* p = (text += "7").data();
+    size_t n = text.size() - 1;
+    unsigned int ints[2] = {5, 5};
+    unsigned long long longs[2] = {5, 5};
+    bool verdicts[6] = {D::StringToIntId(&poolM, ids[0], whole, errors[0], ints[0]),
+                        D::StringToIntId(&poolM, ids[0], p, n, errors[1], ints[1]),
+                        D::StringToLongId(&poolM, ids[1], whole, errors[2], longs[0]),
+                        D::StringToLongId(&poolM, ids[1], p, n, errors[3], longs[1]),
+                        D::StringToStringId(&poolM, ids[2], whole, errors[4], strings[0]),
+                        D::StringToStringId(&poolM, ids[2], p, n, errors[5], strings[1])};
+    for (int i = 0; i < 6; i += 2) EXPECT_TRUE(verdicts[i] == verdicts[i + 1] && errors[i] == errors[i + 1]) << i;
+    EXPECT_TRUE(ints[0] == ints[1] && longs[0] == longs[1] && strings[0] == strings[1]) << text;
+  }
 }
 
 TEST_F(DictionaryObjectTest, ValuesThatConvert) {

@@ -197,7 +197,7 @@ TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
     static_cast<sarnschema::Error*>(chain.back().Get())->codeM = 3;
     if (i > 0) static_cast<sarnschema::Error*>(chain[i - 1].Get())->causeM = chain.back();
   }
-  auto varintLength = [](size_t n) { return n < 128 ? 1u : n < 16384 ? 2u : n < 2097152 ? 3u : 4u; };
+  auto varintLength = [](size_t n) { return sarntest::Varint(n).size(); };
   struct Writer {
     const char* label;
     std::function<bool(VekMempool*, std::string&)> write;

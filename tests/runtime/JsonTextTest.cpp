@@ -100,19 +100,6 @@ TEST_F(JsonTextTest, MemoryReaderInterns) {
   EXPECT_EQ(table.Count(), 2u);
 }
 
-TEST_F(JsonTextTest, SourceReaderAgreesWithMemoryOnClosedStringsAtEverySplit) {
-  const std::vector<std::string> inputs = {
-      "  \"x\\ty\" ,", "-12.5e+3,", "{", "\"a\\u00e9b\"", "\"\\/\\\\\\\"\\b\\f\\n\\r\\t|\"", "tok", "\"\"",
-      "\"esc at end\\n\"", "\t\"\xC3\xA9\"\n", "\"\\u\"",
-  };
-  for (const std::string& input : inputs) {
-    ReadResult expected = ReadMemory(&poolM, input);
-    sarntest::ForEachSplit(input, [&](const std::vector<std::string_view>& chunks, const std::string& label) {
-      EXPECT_EQ(ReadSource(&poolM, chunks).Text(), expected.Text()) << input << " " << label;
-    });
-  }
-}
-
 TEST_F(JsonTextTest, SourceReaderIsStricterAtTheEnd) {
   for (std::string_view bad : {std::string_view("\"abc"), std::string_view("\""), std::string_view("\"a\\"),
                                std::string_view("\"a\\\0\"", 5), std::string_view("\"a\\q\""),

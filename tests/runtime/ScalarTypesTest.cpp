@@ -93,6 +93,39 @@ TEST_P(ScalarTypesTest, Currencies) {
   EXPECT_EQ(Str(full.ToString()), "ABCD.1") << "a code without NUL is read within its bytes";
 }
 
+// Oracle: canonical texts are read by hand, so every text near that shape (random digits, some
+// byte swapped for a separator, space or NUL, or cut off) gives what strptime and timegm give, in
+// the string form and in the byte form (which reads only its n bytes: a digit follows them).
+TEST_P(ScalarTypesTest, HandReadTextsAgreeWithStrptime) {
+  auto reference = [](const std::string& text, const char* format, bool isTime) -> long long {
+    struct tm tm = {};
+    time_t epoch = 0;
+    if (isTime) gmtime_r(&epoch, &tm);
+    const char* end = strptime(text.c_str(), format, &tm);
+    return end != nullptr && *end == '\0' ? static_cast<long long>(timegm(&tm)) : 0;
+  };
+  std::srand(7);
+  const char odd[] = "-: T0\0";
+  for (int i = 0; i < 50000; ++i) {
+    std::string text = "2000-01-01 00:00:00";
+    for (int k : {0, 1, 2, 3, 5, 6, 8, 9, 11, 12, 14, 15, 17, 18}) text[k] = static_cast<char>('0' + std::rand() % (k % 3 == 2 ? 7 : 10));
+    if (std::rand() % 2) text[10] = 'T';
+    if (std::rand() % 4 == 0) text[std::rand() % text.size()] = odd[std::rand() % (sizeof odd - 1)];
+    if (std::rand() % 4 == 0) text.resize(std::rand() % text.size());
+    std::string date = text.substr(0, 10), time = text.size() > 11 ? text.substr(11) : "";
+    std::string all = text + "7", clock = time + "7";
+    long long seconds = reference(text, "%F %T", false);
+    if (seconds == 0) seconds = reference(text, "%FT%T", false);
+    ASSERT_EQ(DateTime::Parse(Text(text)).millisecondsM, seconds * 1000) << text;
+    ASSERT_EQ(Date::Parse(Text(date)).daysM, reference(date, "%F", false) / 86400) << date;
+    ASSERT_EQ(Time::Parse(Text(time)).millisecondsM, reference(time, "%T", true) * 1000) << time;
+    ASSERT_TRUE(DateTime::Parse(all.data(), text.size()) == DateTime::Parse(Text(text)) &&
+                Date::Parse(all.data(), date.size()) == Date::Parse(Text(date)) &&
+                Time::Parse(clock.data(), time.size()) == Time::Parse(Text(time)))
+        << text;
+  }
+}
+
 // Zero values, value to text, and text to value over the whole range of years.
 TEST_P(ScalarTypesTest, DatesTimesAndDateTimes) {
   EXPECT_TRUE(Date::Parse(Text("")) == Date::ZERO && Time::Parse(Text("24:00:00")) == Time::ZERO &&

@@ -150,17 +150,8 @@ TEST(SchemaTables, RepresentativeTypesFieldForField) {
       expected += line + "\n";
     }
   }
-  EXPECT_EQ(sections, 22);
+  EXPECT_EQ(sections, 24);
   EXPECT_EQ(Type("kernoCurrentTimeGet")->nFieldInfo, 1);
-}
-
-TEST(SchemaTables, NamedEnums) {
-  unsigned int number = 99;
-  EXPECT_TRUE(EnumNameNumber(702, "internalError", number));
-  EXPECT_STREQ(EnumNumberName(702, number), "internalError");
-  // The video-resolution enum is the one asset.videoResolution names.
-  const StructInfo* asset = Type("asset");
-  EXPECT_EQ(EnumValues(asset->vFieldInfo[FieldNumber(asset, "videoResolution")].refIndex), "1=sd 100=hd 200=uhd nValue 201");
 }
 
 TEST(SchemaTables, TypesIdsNamesAndPrefixes) {
@@ -291,7 +282,10 @@ TEST(SchemaTables, FieldSelectionByVersion) {
   EXPECT_FALSE(FieldTakesPart(ad->vFieldInfo[0], 0));
 }
 
-TEST(SchemaTables, LookupByNameWithinFiveProbes) {
+// Every type is found by its name within five probes, and its factory makes an object of it whose
+// optional fields are all absent.
+TEST(SchemaTables, LookupByNameAndFactories) {
+  VekMempool pool("factories");
   EXPECT_EQ(Schema::structNameHashTableSizeG, 3532);
   int filled = 0, worst = 0;
   for (int slot = 0; slot < Schema::structNameHashTableSizeG; ++slot) filled += Schema::structNameHashTableG[slot] != nullptr;
@@ -301,6 +295,15 @@ TEST(SchemaTables, LookupByNameWithinFiveProbes) {
     const StructInfo* info = Schema::vStructDefG[id];
     if (info == nullptr) continue;
     EXPECT_EQ(StructInfoMap::LookupStructByName(info->pName), info);
+    ref<SarnObject> object = info->pFactory(&pool);
+    ASSERT_TRUE(object) << info->pName;
+    EXPECT_TRUE(object->GetRefCount() == 1 && object->GetTypeId() == static_cast<uint32_t>(id) &&
+                object->GetMempool() == &pool && object->GetStructInfo() == info && object->GetTypeName() == info->pName)
+        << info->pName;
+    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+      const FieldInfo& f = info->vFieldInfo[n];
+      EXPECT_FALSE(f.arity == SARN_ARITY_OPTIONAL && IsFieldPresent(object.Get(), f)) << info->pName << " " << n;
+    }
     uint32_t slot = StructInfoMap::HomeSlot(info->pName, Schema::structNameHashTableSizeG);
     int probes = 1;
     for (; Schema::structNameHashTableG[slot] != info; ++probes) slot = (slot + 1) % Schema::structNameHashTableSizeG;
@@ -310,4 +313,6 @@ TEST(SchemaTables, LookupByNameWithinFiveProbes) {
   EXPECT_EQ(StructInfoMap::LookupStructByName("address"), &sarnschema::Address::structInfoG);
   for (const char* miss : {"Address", "", "addres", "addressX"}) EXPECT_EQ(StructInfoMap::LookupStructByName(miss), nullptr) << miss;
   EXPECT_EQ(StructInfoMap::LookupStructByName(nullptr), nullptr);
+  EXPECT_EQ(sarnschema::Ad::Factory(&pool)->GetTypeId(), 140u);
+  EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }

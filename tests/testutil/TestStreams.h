@@ -24,6 +24,13 @@ inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
   return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
 }
 
+// The protocol-buffer varint of `value`.
+inline std::string Varint(uint64_t value) {
+  std::string bytes;
+  for (; value >= 0x80; value >>= 7) bytes.push_back(static_cast<char>((value & 0x7F) | 0x80));
+  return bytes + static_cast<char>(value);
+}
+
 // What a binary stream holds once finished.
 inline std::string Finished(sarn::ProtoBufByteOutputStream& stream) {
   const unsigned char* data;

@@ -184,7 +184,7 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
     }
     if (isType) {
       if (!RecordType(self, input, ordinal, error)) return false;
-    } else if (!Value(self, depth + 1, input, field, object.Get(), error)) {
+    } else if (!Member(self, depth + 1, input, field, object.Get(), error)) {
       Append(pool, error, kForKeyG);
       Append(pool, error, keyAt < 0 ? keyText : state->pKeysM + keyAt, keyLength);
       return false;
@@ -199,6 +199,28 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
   }
   if (result != nullptr) *result = static_cast<ref<SarnObject>&&>(object);
   return true;
+}
+
+// Value, with the most common members (a scalar into a single field, or a token skipped) read
+// without its two calls; verdicts and messages are Value's.
+inline bool JsonSarnObject::Reader::Member(JsonSarnObject& self, int depth, InputPointerBytesource& input,
+                                           const FieldInfo* field, SarnObject* object, VekString& error) {
+  char c = SkipPeek(input);
+  if (c != '[' && c != '{') {
+    bool isRead;
+    if (field == nullptr) {
+      isRead = SkipToken(input);
+    } else if (field->arity != SARN_ARITY_MULTI && field->dataType != SARN_DATA_TYPE_KNOWN_DICT &&
+               field->dataType != SARN_DATA_TYPE_SUBDICT && field->dataType != SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY &&
+               field->dataType != SARN_DATA_TYPE_ANY_DICT) {
+      isRead = Scalar(self, input, *field, object, error);
+    } else {
+      return Value(self, depth, input, field, object, error);
+    }
+    if (!isRead) Append(self.pMempoolM, error, kSingleFailedG);
+    return isRead;
+  }
+  return Value(self, depth, input, field, object, error);
 }
 
 bool JsonSarnObject::Reader::Value(JsonSarnObject& self, int depth, InputPointerBytesource& input,
@@ -400,6 +422,8 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
   const unsigned char* p = token.pM;
   size_t n = token.nM;
   auto text = [&]() { return internal::TokenString(pool, token, hold); };
+  const char* chars = reinterpret_cast<const char*>(p);
+  const VekString* held = token.isHeldM ? &hold : nullptr;
   bool isNegative;
   unsigned long long digits;
   switch (field.dataType) {
@@ -460,7 +484,9 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       if (def == nullptr || std::memchr(p, 0, n) != nullptr) return false;
       for (uint64_t i = 0; i < def->nValue; ++i) {
         const char* name = def->vName[i];
-        if (name == nullptr || std::strncmp(name, reinterpret_cast<const char*>(p), n) != 0 || name[n] != '\0') {
+        // (The first byte rejects most names without a call; an empty token matches only "".)
+        if (name == nullptr || (n != 0 && name[0] != static_cast<char>(p[0])) ||
+            std::strncmp(name, reinterpret_cast<const char*>(p), n) != 0 || name[n] != '\0') {
           continue;
         }
         uint32_t value = static_cast<uint32_t>(i);
@@ -468,23 +494,27 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       }
       return false;
     }
-    case SARN_DATA_TYPE_STRING:
-      return Store(self, FieldAccess::PutString(object, field, text()), field, object, error);
+    case SARN_DATA_TYPE_STRING: {
+      VekString value = text();
+      return Store(self, FieldAccess::PutString(object, field, static_cast<VekString&&>(value)), field, object, error);
+    }
     case SARN_DATA_TYPE_STRING_ID: {
+      // Ids are converted from the token's bytes in place (the held token as the string it is).
       VekString value, inner;
-      if (!DictionarySarnObject::StringToStringId(pool, &field, text(), inner, value)) return false;
-      return Store(self, FieldAccess::PutString(object, field, value), field, object, error);
+      if (!DictionarySarnObject::StringToStringId(pool, &field, chars, n, inner, value, held)) return false;
+      return Store(self, FieldAccess::PutString(object, field, static_cast<VekString&&>(value)), field, object,
+                   error);
     }
     case SARN_DATA_TYPE_INT_ID: {
       unsigned int value;
       VekString inner;
-      if (!DictionarySarnObject::StringToIntId(pool, &field, text(), inner, value)) return false;
+      if (!DictionarySarnObject::StringToIntId(pool, &field, chars, n, inner, value, held)) return false;
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_LONG_ID: {
       unsigned long long value;
       VekString inner;
-      if (!DictionarySarnObject::StringToLongId(pool, &field, text(), inner, value)) return false;
+      if (!DictionarySarnObject::StringToLongId(pool, &field, chars, n, inner, value, held)) return false;
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_BYTESTRING: {
@@ -503,15 +533,15 @@ bool JsonSarnObject::Reader::Scalar(JsonSarnObject& self, InputPointerBytesource
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_DATE: {
-      Date value = Date::Parse(text());
+      Date value = Date::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_DATETIME: {
-      DateTime value = DateTime::Parse(text());
+      DateTime value = DateTime::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     case SARN_DATA_TYPE_TIME: {
-      Time value = Time::Parse(text());
+      Time value = Time::Parse(chars, n);
       return Store(self, FieldAccess::PutScalar(object, field, &value), field, object, error);
     }
     default:

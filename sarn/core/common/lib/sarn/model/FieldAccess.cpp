@@ -5,15 +5,15 @@
 
 namespace sarn {
 
-bool FieldAccess::PutScalar(SarnObject* object, const FieldInfo& field, const void* value) {
-  if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekGenericIntArray>(object, field).Add(value);
-  std::memcpy(FieldStorage(object, field), value, ScalarWidth(field.dataType));
-  return true;
-}
-
 bool FieldAccess::PutString(SarnObject* object, const FieldInfo& field, const VekString& value) {
   if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekStringArray>(object, field).Add(value);
   FieldRef<VekString>(object, field) = value;
+  return true;
+}
+
+bool FieldAccess::PutString(SarnObject* object, const FieldInfo& field, VekString&& value) {
+  if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekStringArray>(object, field).Add(value);
+  FieldRef<VekString>(object, field) = static_cast<VekString&&>(value);
   return true;
 }
 

@@ -215,8 +215,16 @@ class SARN_EXPORT FieldAccess {
 
   // Store into a single field, or append to a multi-valued one. False only when an array is full
   // (65,535 elements) or out of memory; nothing changes then.
-  static bool PutScalar(SarnObject* object, const FieldInfo& field, const void* value);
+  // (PutScalar is inline: readers store a scalar per value read.)
+  static bool PutScalar(SarnObject* object, const FieldInfo& field, const void* value) {
+    if (field.arity == SARN_ARITY_MULTI) return FieldRef<VekGenericIntArray>(object, field).Add(value);
+    std::memcpy(FieldStorage(object, field), value, ScalarWidth(field.dataType));
+    return true;
+  }
   static bool PutString(SarnObject* object, const FieldInfo& field, const VekString& value);
+  // The same, taking the string over where it can (a single field): a reader's fresh string is
+  // stored without a second reference.
+  static bool PutString(SarnObject* object, const FieldInfo& field, VekString&& value);
   static bool PutReference(SarnObject* object, const FieldInfo& field, VekCore* value);
 };
 

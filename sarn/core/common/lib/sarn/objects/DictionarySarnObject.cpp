@@ -522,62 +522,95 @@ bool DictionarySarnObject::StringToEnum(const FieldInfo& field, const VekString&
   return true;
 }
 
-bool DictionarySarnObject::SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const VekString& text,
+bool DictionarySarnObject::SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const char* text, size_t n,
                                         VekString& error, size_t& prefixLength) {
   const StructInfo* target = StructInfoForId(field->refIndex);
   if (target == nullptr) {
     Append(pool, error, "no struct for id");
-    return false;
-  }
-  const char* prefix = target->pIdPrefix != nullptr ? target->pIdPrefix : "";
-  size_t length = std::strlen(prefix);
-  if (text.NByte() < length || std::memcmp(text.Utf8(), prefix, length) != 0) {
+  } else {
+    const char* prefix = target->pIdPrefix != nullptr ? target->pIdPrefix : "";
+    size_t length = std::strlen(prefix);
+    if (n >= length && std::memcmp(text, prefix, length) == 0) {
+      prefixLength = length;
+      return true;
+    }
     Append(pool, error, "wrong prefix on id");
+  }
+  AppendBadPrefix(pool, text, n, error);
+  return false;
+}
+
+void DictionarySarnObject::AppendBadPrefix(VekMempool* pool, const char* text, size_t n, VekString& error) {
+  // The text is shown as a C string: up to its first NUL.
+  error = VekString::Format(pool, "%sbad prefix: %.*s", error.Utf8(), static_cast<int>(strnlen(text, n)), text);
+}
+
+// The number after the prefix goes through Dict's parsers, which read a C string: the bytes up to
+// the first NUL, copied next to a NUL of their own (on the stack when short, as ids are).
+// A text that is already a C string (`isTerminated`) is read where it is.
+template <class T>
+static bool ParseIdNumber(VekMempool* pool, const char* text, size_t n, bool isTerminated,
+                          T (*parse)(VekMempool*, const char*), VekString& error, T& out) {
+  if (isTerminated) {
+    out = parse(pool, text);
+    return true;
+  }
+  n = strnlen(text, n);
+  char small[64];
+  if (n < sizeof small) {
+    std::memcpy(small, text, n);
+    small[n] = '\0';
+    out = parse(pool, small);
+    return true;
+  }
+  VekString copy = VekString::FromUtf8Bytes(pool, n, text);
+  if (copy.FEmpty()) {
+    Append(pool, error, kOutOfMemoryMessage);
     return false;
   }
-  prefixLength = length;
+  out = parse(pool, copy.Utf8());
   return true;
 }
 
-void DictionarySarnObject::AppendBadPrefix(VekMempool* pool, const VekString& text, VekString& error) {
-  Append(pool, error, "bad prefix: ", text.Utf8());
+bool DictionarySarnObject::StringToIntId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n,
+                                         VekString& error, unsigned int& out, const VekString* whole) {
+  size_t skip;
+  return SkipIdPrefix(pool, field, text, n, error, skip) &&
+         ParseIdNumber(pool, text + skip, n - skip, whole != nullptr, &Dict::ParseU32, error, out);
 }
 
 bool DictionarySarnObject::StringToIntId(VekMempool* pool, const FieldInfo* field, const VekString& text,
                                          VekString& error, unsigned int& out) {
+  return StringToIntId(pool, field, text.Utf8(), text.NByte(), error, out, &text);
+}
+
+bool DictionarySarnObject::StringToLongId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n,
+                                          VekString& error, unsigned long long& out, const VekString* whole) {
   size_t skip;
-  if (!SkipIdPrefix(pool, field, text, error, skip)) {
-    AppendBadPrefix(pool, text, error);
-    return false;
-  }
-  out = Dict::ParseU32(pool, text.Utf8() + skip);
-  return true;
+  return SkipIdPrefix(pool, field, text, n, error, skip) &&
+         ParseIdNumber(pool, text + skip, n - skip, whole != nullptr, &Dict::ParseLongId, error, out);
 }
 
 bool DictionarySarnObject::StringToLongId(VekMempool* pool, const FieldInfo* field, const VekString& text,
                                           VekString& error, unsigned long long& out) {
+  return StringToLongId(pool, field, text.Utf8(), text.NByte(), error, out, &text);
+}
+
+bool DictionarySarnObject::StringToStringId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n,
+                                            VekString& error, VekString& out, const VekString* whole) {
   size_t skip;
-  if (!SkipIdPrefix(pool, field, text, error, skip)) {
-    AppendBadPrefix(pool, text, error);
+  if (!SkipIdPrefix(pool, field, text, n, error, skip)) return false;
+  out = skip == 0 && whole != nullptr ? *whole : VekString::FromUtf8Bytes(pool, n - skip, text + skip);
+  if (out.FEmpty() && n != skip) {
+    Append(pool, error, kOutOfMemoryMessage);
     return false;
   }
-  out = Dict::ParseLongId(pool, text.Utf8() + skip);
   return true;
 }
 
 bool DictionarySarnObject::StringToStringId(VekMempool* pool, const FieldInfo* field, const VekString& text,
                                             VekString& error, VekString& out) {
-  size_t skip;
-  if (!SkipIdPrefix(pool, field, text, error, skip)) {
-    AppendBadPrefix(pool, text, error);
-    return false;
-  }
-  out = skip == 0 ? text : VekString::FromUtf8Bytes(pool, text.NByte() - skip, text.Utf8() + skip);
-  if (out.FEmpty() && text.NByte() != skip) {
-    Append(pool, error, kOutOfMemoryMessage);
-    return false;
-  }
-  return true;
+  return StringToStringId(pool, field, text.Utf8(), text.NByte(), error, out, &text);
 }
 
 bool DictionarySarnObject::DictValueToLazyDict(const ref<DictValue>& value, ref<LazyDict>& out, VekString& error,

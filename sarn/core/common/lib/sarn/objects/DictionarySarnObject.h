@@ -68,6 +68,16 @@ class SARN_EXPORT DictionarySarnObject {
                              unsigned long long& out);
   static bool StringToStringId(VekMempool* pool, const FieldInfo* field, const VekString& text, VekString& error,
                                VekString& out);
+  // The same over the bytes [text, text + n), which need not end with a NUL: readers that hold
+  // the text in place convert it without a string of their own. Texts, values and messages are
+  // those of the string forms (one implementation); `whole`, when given, is the text as a string
+  // (read where it is, and a string id without prefix shares it).
+  static bool StringToIntId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n, VekString& error,
+                            unsigned int& out, const VekString* whole = nullptr);
+  static bool StringToLongId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n, VekString& error,
+                             unsigned long long& out, const VekString* whole = nullptr);
+  static bool StringToStringId(VekMempool* pool, const FieldInfo* field, const char* text, size_t n, VekString& error,
+                               VekString& out, const VekString* whole = nullptr);
 
   VekMempool* pMempoolM;
   const StructInfo* const* structDefsM;
@@ -84,9 +94,10 @@ class SARN_EXPORT DictionarySarnObject {
   bool ReadValue(const FieldInfo& field, const ref<DictValue>& value, SarnObject* object, VekString& error,
                  KernoVersion version, bool isMulti);
   bool StringToEnum(const FieldInfo& field, const VekString& text, VekString& error, uint32_t& value);
-  static bool SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const VekString& text, VekString& error,
+  // The length of the prefix that starts the text; false with the messages of a bad prefix.
+  static bool SkipIdPrefix(VekMempool* pool, const FieldInfo* field, const char* text, size_t n, VekString& error,
                            size_t& prefixLength);
-  static void AppendBadPrefix(VekMempool* pool, const VekString& text, VekString& error);
+  static void AppendBadPrefix(VekMempool* pool, const char* text, size_t n, VekString& error);
   static bool DictValueToLazyDict(const ref<DictValue>& value, ref<LazyDict>& out, VekString& error,
                                   VekMempool* pool, KernoVersion version);
 

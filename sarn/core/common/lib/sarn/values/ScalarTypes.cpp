@@ -38,6 +38,49 @@ bool ParseWhole(const VekString& text, const char* format, struct tm& tm) {
   return end != nullptr && end == EndOf(text);
 }
 
+// The canonical texts "YYYY-MM-DD" and "HH:MM:SS" are read by hand: for them strptime's "%F" and
+// "%T" read each field's two or four digits whole (no field can stop early: months 01-12, days
+// 01-31, hours 00-23, minutes and seconds 00-59), and timegm's value is the arithmetic below,
+// a day past the month's end running into the next month as timegm normalises it. Any other
+// text (spaces, single digits, leap seconds, NUL bytes, ...) goes to strptime itself.
+bool Digits(const char* text, int count, int& value) {
+  value = 0;
+  for (int i = 0; i < count; ++i) {
+    if (!IsDigit(text[i])) return false;
+    value = value * 10 + (text[i] - '0');
+  }
+  return true;
+}
+
+bool CanonicalDate(const char* text, long long& days) {
+  int year, month, day;
+  if (!Digits(text, 4, year) || text[4] != '-' || !Digits(text + 5, 2, month) || text[7] != '-' ||
+      !Digits(text + 8, 2, day) || month < 1 || month > 12 || day < 1 || day > 31) {
+    return false;
+  }
+  // Days since 1970-01-01 of the proleptic Gregorian calendar, the year starting in March.
+  long long y = year - (month <= 2 ? 1 : 0);
+  long long era = y / 400;  // y >= -1: only year 0's January and February fall before era 0
+  if (y < 0) era = -1;
+  long long yearOfEra = y - era * 400;
+  long long dayOfYear = (153 * (month > 2 ? month - 3 : month + 9) + 2) / 5 + day - 1;
+  days = era * 146097 + yearOfEra * 365 + yearOfEra / 4 - yearOfEra / 100 + dayOfYear - 719468;
+  return true;
+}
+
+bool CanonicalTime(const char* text, long long& seconds) {
+  int hour, minute, second;
+  if (!Digits(text, 2, hour) || text[2] != ':' || !Digits(text + 3, 2, minute) || text[5] != ':' ||
+      !Digits(text + 6, 2, second) || hour > 23 || minute > 59 || second > 59) {
+    return false;
+  }
+  seconds = hour * 3600LL + minute * 60 + second;
+  return true;
+}
+
+// The text up to its first NUL, as the C functions see it, for strptime.
+VekString CString(const char* text, size_t n) { return VekString::FromUtf8Bytes(nullptr, strnlen(text, n), text); }
+
 VekString FormatUtc(long long seconds, const char* format) {
   time_t t = static_cast<time_t>(seconds);
   struct tm tm;
@@ -110,14 +153,24 @@ bool Currency::operator==(const Currency& other) const {
 }
 
 Date Date::Parse(const VekString& text) {
+  long long days;
+  if (text.NByte() == 10 && CanonicalDate(text.Utf8(), days)) return Date(static_cast<int32_t>(days));
   struct tm tm = {};
   if (!ParseWhole(text, "%F", tm)) return ZERO;
   return Date(static_cast<int32_t>(timegm(&tm) / kSecondsPerDay));
 }
 
+Date Date::Parse(const char* text, size_t n) {
+  long long days;
+  if (strnlen(text, n) == 10 && CanonicalDate(text, days)) return Date(static_cast<int32_t>(days));
+  return Parse(CString(text, n));
+}
+
 VekString Date::ToString() const { return FormatUtc(daysM * kSecondsPerDay, "%F"); }
 
 Time Time::Parse(const VekString& text) {
+  long long seconds;
+  if (text.NByte() == 8 && CanonicalTime(text.Utf8(), seconds)) return Time(static_cast<int32_t>(seconds * 1000));
   time_t epoch = 0;
   struct tm tm;
   gmtime_r(&epoch, &tm);
@@ -125,15 +178,41 @@ Time Time::Parse(const VekString& text) {
   return Time(static_cast<int32_t>(timegm(&tm) * 1000));
 }
 
+Time Time::Parse(const char* text, size_t n) {
+  long long seconds;
+  if (strnlen(text, n) == 8 && CanonicalTime(text, seconds)) return Time(static_cast<int32_t>(seconds * 1000));
+  return Parse(CString(text, n));
+}
+
 VekString Time::ToString() const { return FormatUtc(millisecondsM / 1000, "%T"); }
 
+// "YYYY-MM-DD HH:MM:SS" or with 'T' between: the space of the first format matches the space
+// (and, matching no space at all, fails on the 'T', which the second format then matches).
+static bool CanonicalDateTime(const char* text, size_t n, DateTime& value) {
+  long long days, seconds;
+  if (n != 19 || (text[10] != ' ' && text[10] != 'T') || !CanonicalDate(text, days) ||
+      !CanonicalTime(text + 11, seconds)) {
+    return false;
+  }
+  value = DateTime((days * kSecondsPerDay + seconds) * 1000);
+  return true;
+}
+
 DateTime DateTime::Parse(const VekString& text) {
+  DateTime value;
+  if (CanonicalDateTime(text.Utf8(), text.NByte(), value)) return value;
   struct tm tm = {};
   if (!ParseWhole(text, "%F %T", tm)) {
     tm = {};
     if (!ParseWhole(text, "%FT%T", tm)) return ZERO;
   }
   return DateTime(static_cast<int64_t>(timegm(&tm)) * 1000);
+}
+
+DateTime DateTime::Parse(const char* text, size_t n) {
+  DateTime value;
+  if (CanonicalDateTime(text, strnlen(text, n), value)) return value;
+  return Parse(CString(text, n));
 }
 
 VekString DateTime::ToString() const { return FormatUtc(millisecondsM / 1000, "%F %T"); }

@@ -68,6 +68,8 @@ struct SARN_EXPORT Date {
   constexpr explicit Date(int32_t days) : daysM(days) {}
   // "2021-03-04" (strptime "%F" consuming the whole text); ZERO otherwise.
   static Date Parse(const VekString& text);
+  // The same over the bytes [text, text + n), read up to the first NUL as the string form reads.
+  static Date Parse(const char* text, size_t n);
   // "%F" of the day.
   VekString ToString() const;
   bool operator==(const Date& other) const { return daysM == other.daysM; }
@@ -84,6 +86,8 @@ struct SARN_EXPORT Time {
   constexpr explicit Time(int32_t milliseconds) : millisecondsM(milliseconds) {}
   // "13:05:09" (strptime "%T" consuming the whole text); ZERO otherwise.
   static Time Parse(const VekString& text);
+  // The same over the bytes [text, text + n), read up to the first NUL as the string form reads.
+  static Time Parse(const char* text, size_t n);
   // "%T"; milliseconds are dropped. Values outside one day have no defined text.
   VekString ToString() const;
   bool operator==(const Time& other) const { return millisecondsM == other.millisecondsM; }
@@ -100,6 +104,8 @@ struct SARN_EXPORT DateTime {
   constexpr explicit DateTime(int64_t milliseconds) : millisecondsM(milliseconds) {}
   // "2021-03-04 13:05:09" or "2021-03-04T13:05:09"; ZERO otherwise.
   static DateTime Parse(const VekString& text);
+  // The same over the bytes [text, text + n), read up to the first NUL as the string form reads.
+  static DateTime Parse(const char* text, size_t n);
   // Always the space form; milliseconds are dropped.
   VekString ToString() const;
   // The wall clock, to the millisecond.

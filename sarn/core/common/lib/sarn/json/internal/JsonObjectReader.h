@@ -45,10 +45,17 @@ inline uint32_t NameHash(const unsigned char* p, size_t n) {
 // read leaves the caller's pool as it found it): a field-name index per type met, the keys of
 // the members being read (for messages), and the state of the current read.
 struct JsonSarnObject::ReadState {
+  // One slot per field name: the field, its name and length, and the name's first eight bytes as
+  // a number, so that most keys are matched without touching the schema's tables.
+  struct NameSlot {
+    const FieldInfo* pFieldM;  // null for an empty slot
+    const char* pNameM;
+    uint64_t headM;
+    size_t nM;
+  };
   struct NameIndex {
     const StructInfo* pTypeM;
-    uint16_t* vSlotM;  // field number + 1, 0 for an empty slot
-    uint16_t* vLengthM;  // per slot: the length of the field's name
+    NameSlot* vSlotM;
     uint32_t maskM;
   };
   static constexpr unsigned kIndexes = 64;
@@ -65,12 +72,27 @@ struct JsonSarnObject::ReadState {
   const FieldInfo* Find(const StructInfo* type, const unsigned char* key, size_t n) {
     NameIndex& index = vIndexM[(reinterpret_cast<uintptr_t>(type) >> 4) % kIndexes];
     if (index.pTypeM != type && !Build(index, type)) return LinearFind(type, key, n);
+    uint64_t head = Head(key, n);
     for (uint32_t slot = internal::NameHash(key, n) & index.maskM;; slot = (slot + 1) & index.maskM) {
-      unsigned entry = index.vSlotM[slot];
-      if (entry == 0) return nullptr;
-      const FieldInfo& field = type->vFieldInfo[entry - 1];
-      if (index.vLengthM[slot] == n && std::memcmp(FieldName(type, field), key, n) == 0) return &field;
+      const NameSlot& entry = index.vSlotM[slot];
+      if (entry.pFieldM == nullptr) return nullptr;
+      if (entry.nM == n && entry.headM == head && (n <= 8 || SameBytes(entry.pNameM + 8, key + 8, n - 8))) {
+        return entry.pFieldM;
+      }
     }
+  }
+  // The first (up to) eight bytes of a name, the first in the lowest byte.
+  static uint64_t Head(const unsigned char* p, size_t n) {
+    uint64_t head = 0;
+    for (size_t i = 0; i < n && i < 8; ++i) head |= static_cast<uint64_t>(p[i]) << (8 * i);
+    return head;
+  }
+  // Field names are short: a loop beats a call.
+  static bool SameBytes(const char* name, const unsigned char* key, size_t n) {
+    for (size_t i = 0; i < n; ++i) {
+      if (static_cast<unsigned char>(name[i]) != key[i]) return false;
+    }
+    return true;
   }
   static const FieldInfo* LinearFind(const StructInfo* type, const unsigned char* key, size_t n) {
     for (unsigned i = 0; i < type->nFieldInfo; ++i) {
@@ -88,27 +110,24 @@ struct JsonSarnObject::ReadState {
   bool Build(NameIndex& index, const StructInfo* type) {
     uint32_t size = 8;
     while (size < 2u * type->nFieldInfo) size *= 2;
-    auto* slots = static_cast<uint16_t*>(VekMempool::Default()->Calloc(2 * size, sizeof(uint16_t)));
+    auto* slots = static_cast<NameSlot*>(VekMempool::Default()->Calloc(size, sizeof(NameSlot)));
     if (slots == nullptr) return false;
     VekMempool::Default()->Free(index.vSlotM);
     index.pTypeM = type;
     index.vSlotM = slots;
-    index.vLengthM = slots + size;
     index.maskM = size - 1;
     for (unsigned i = 0; i < type->nFieldInfo; ++i) {
       const FieldInfo& field = type->vFieldInfo[i];
       if (field.arity == SARN_ARITY_NONE) continue;
       const char* name = FieldName(type, field);
       size_t n = std::strlen(name);
-      if (n > UINT16_MAX) return false;  // no index for such a type: it is searched linearly
-      for (uint32_t slot = internal::NameHash(reinterpret_cast<const unsigned char*>(name), n) & index.maskM;;
-           slot = (slot + 1) & index.maskM) {
-        if (slots[slot] == 0) {
-          slots[slot] = static_cast<uint16_t>(i + 1);
-          index.vLengthM[slot] = static_cast<uint16_t>(n);
+      const auto* bytes = reinterpret_cast<const unsigned char*>(name);
+      for (uint32_t slot = internal::NameHash(bytes, n) & index.maskM;; slot = (slot + 1) & index.maskM) {
+        if (slots[slot].pFieldM == nullptr) {
+          slots[slot] = NameSlot{&field, name, Head(bytes, n), n};
           break;
         }
-        if (std::strcmp(FieldName(type, type->vFieldInfo[slots[slot] - 1]), name) == 0) break;  // the first stays
+        if (std::strcmp(slots[slot].pNameM, name) == 0) break;  // the first stays
       }
     }
     return true;
@@ -156,6 +175,8 @@ class __attribute__((visibility("hidden"))) JsonSarnObject::Reader {
   // One value of a field that holds no objects, converted and stored (a single field) or appended.
   static bool Scalar(JsonSarnObject& self, InputPointerBytesource& input, const FieldInfo& field, SarnObject* object,
                      VekString& error);
+  static bool Member(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo* field,
+                     SarnObject* object, VekString& error);
   static bool Store(JsonSarnObject& self, bool isStored, const FieldInfo& field, SarnObject* object,
                     VekString& error);
   static bool Nested(JsonSarnObject& self, int depth, InputPointerBytesource& input, const FieldInfo& field,

@@ -29,7 +29,8 @@ inline constexpr BareTokenBytes kBareTokenBytesG;
 
 // The end of a quoted run at `p`: the first closing quote, backslash or NUL before `end`. Eight
 // bytes at a time: a byte of the word is one of the three when the word XORed with its pattern
-// (or the word itself, for NUL) has a zero byte.
+// (or the word itself, for NUL) has a zero byte. A borrow can mark bytes above the first zero
+// byte, never below it, so on a little-endian machine the lowest mark is the first match.
 inline const unsigned char* QuotedRunEnd(const unsigned char* p, const unsigned char* end) {
   constexpr uint64_t kOnes = 0x0101010101010101ull, kHighs = 0x8080808080808080ull;
   while (end - p >= 8) {
@@ -37,7 +38,14 @@ inline const unsigned char* QuotedRunEnd(const unsigned char* p, const unsigned 
     std::memcpy(&word, p, 8);
     uint64_t quote = word ^ (kOnes * '"'), backslash = word ^ (kOnes * '\\');
     uint64_t found = ((word - kOnes) & ~word) | ((quote - kOnes) & ~quote) | ((backslash - kOnes) & ~backslash);
-    if ((found & kHighs) != 0) break;
+    found &= kHighs;
+    if (found != 0) {
+#if defined(__BYTE_ORDER__) && __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__
+      return p + (__builtin_ctzll(found) >> 3);
+#else
+      break;
+#endif
+    }
     p += 8;
   }
   while (p != end && *p != '"' && *p != '\\' && *p != 0) ++p;
