@@ -113,6 +113,7 @@ ref<Dictionary> TreeOf(const LazyDict& payload, const LazyForm& form, VekString&
 
 using internal::FormOf;
 using internal::LazyForm;
+
 namespace internal {
 
 ref<Dict> DictOf(const LazyDict& payload, const LazyForm& form) {
