@@ -161,7 +161,8 @@ bool JsonSarnObject::Reader::Object(JsonSarnObject& self, int depth, InputPointe
       Append(pool, error, kBadKeyG);
       return false;
     }
-    const FieldInfo* field = object ? state->Find(type, key.pM, key.nM) : nullptr;
+    const unsigned char* limit = key.isHeldM ? key.pM + key.nM : input.pEndM;
+    const FieldInfo* field = object ? state->Find(type, key.pM, key.nM, limit) : nullptr;
     bool isType = isFirstPass && key.Is("type", 4);
     // The key is kept for the message of a failing value. Bytes in the cursor's block stay where
     // they are once the source has no more blocks (always, for text in memory); others are copied.

@@ -69,10 +69,21 @@ struct JsonSarnObject::ReadState {
 
   // The field named [key, key + n) of `type`, or null. A key never holds a NUL (the token reader
   // refuses one in a quoted string and ends a bare token there).
-  const FieldInfo* Find(const StructInfo* type, const unsigned char* key, size_t n) {
+  // `limit` ends the readable bytes around the key (at least key + n).
+  const FieldInfo* Find(const StructInfo* type, const unsigned char* key, size_t n, const unsigned char* limit) {
     NameIndex& index = vIndexM[(reinterpret_cast<uintptr_t>(type) >> 4) % kIndexes];
     if (index.pTypeM != type && !Build(index, type)) return LinearFind(type, key, n);
-    uint64_t head = Head(key, n);
+    uint64_t head;
+#if defined(__BYTE_ORDER__) && __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__
+    if (limit - key >= 8) {  // one load, the bytes past the key masked off
+      std::memcpy(&head, key, 8);
+      if (n < 8) head &= (uint64_t{1} << (8 * n)) - 1;
+    } else {
+      head = Head(key, n);
+    }
+#else
+    head = Head(key, n);
+#endif
     for (uint32_t slot = internal::NameHash(key, n) & index.maskM;; slot = (slot + 1) & index.maskM) {
       const NameSlot& entry = index.vSlotM[slot];
       if (entry.pFieldM == nullptr) return nullptr;
