@@ -1,5 +1,5 @@
 // Messages: the wrappers, the four writers, the string reader, the packetizer and the byte-source
-// reader, driven by the tables under tests/data/rpc/. A wrapper is built from a one-line spec and
+// reader, driven by the tables under tests/data/rpc/. A wrapper is built from a one-line recipe and
 // shown as one line (Describe), so that every reader and setting is held to the same text.
 #include <memory>
 #include <sstream>
@@ -28,8 +28,8 @@ struct RpcMessageTest : sarntest::PoolTest {
 
   // "request RPC TYPE COUNT VERSION BODY", "update RPC TYPE BODY", "response RPC FINAL VERSION BODY",
   // "cancel RPC": BODY is JSON to the end of the line, "null", or "object" (a kernoCurrentTimeGet).
-  ref<KernoRpcWrapper> Build(const std::string& spec) {
-    std::istringstream in(spec);
+  ref<KernoRpcWrapper> Build(const std::string& recipe) {
+    std::istringstream in(recipe);
     std::string kind, type, count, body;
     unsigned rpc = 0;
     int version = 0, isFinal = 0;
@@ -123,12 +123,12 @@ struct RpcMessageTest : sarntest::PoolTest {
              : "error " + Str(error);
   }
 
-  // "spec ; op ; op ...": the wrapper after the ops, and what each op answered.
+  // "recipe ; op ; op ...": the wrapper after the ops, and what each op answered.
   ref<KernoRpcWrapper> Apply(const std::string& script, std::string& answers) {
     std::istringstream ops(script);
-    std::string spec, op;
-    std::getline(ops, spec, ';');
-    ref<KernoRpcWrapper> w = Build(spec);
+    std::string recipe, op;
+    std::getline(ops, recipe, ';');
+    ref<KernoRpcWrapper> w = Build(recipe);
     auto* q = dynamic_cast<RequestWrapper*>(w.Get());
     auto* r = dynamic_cast<ResponseWrapper*>(w.Get());
     ref<SarnObject> last;
