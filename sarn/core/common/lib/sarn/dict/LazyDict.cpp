@@ -285,48 +285,51 @@ void LazyDict::BuildDictionaryFromBytesource() {
   pBytesourceM = nullptr;
 }
 
-bool LazyDict::GetType(unsigned int* typeId) {
-  LazyNesting nesting;
-  LazyForm form = FormOf(*this, nesting);
-  VekString error;
+namespace {
+
+// The two type queries differ only in what they read off the object or the tree they find.
+template <class FromObject, class FromTree>
+bool AnswerTypeQuery(LazyDict& payload, FromObject fromObject, FromTree fromTree) {
+  internal::LazyNesting nesting;
+  LazyForm form = FormOf(payload, nesting);
   switch (form.repM) {
-    case REP_PROTOBUF:
-    case REP_OBJECT: {
-      ref<SarnObject> object = form.repM == REP_OBJECT ? form.objectM : internal::ProtobufToObject(*this);
-      if (!object) return false;
-      if (typeId != nullptr) *typeId = object->GetTypeId();
-      return true;
+    case LazyDict::REP_PROTOBUF:
+    case LazyDict::REP_OBJECT: {
+      ref<SarnObject> object =
+          form.repM == LazyDict::REP_OBJECT ? form.objectM : internal::ProtobufToObject(payload);
+      return object && fromObject(*object);
     }
-    case REP_BYTESOURCE:
-      BuildDictionaryFromBytesource();
-      return dictionaryM && TypeIdOfDictionary(*dictionaryM, typeId);
+    case LazyDict::REP_BYTESOURCE:
+      payload.BuildDictionaryFromBytesource();
+      return payload.dictionaryM && fromTree(*payload.dictionaryM);
     default: {
-      ref<Dictionary> tree = internal::TreeOf(*this, form, error, false);
-      return tree && TypeIdOfDictionary(*tree, typeId);
+      VekString error;
+      ref<Dictionary> tree = internal::TreeOf(payload, form, error, false);
+      return tree && fromTree(*tree);
     }
   }
 }
 
+}  // namespace
+
+bool LazyDict::GetType(unsigned int* typeId) {
+  return AnswerTypeQuery(
+      *this,
+      [typeId](const SarnObject& object) {
+        if (typeId != nullptr) *typeId = object.GetTypeId();
+        return true;
+      },
+      [typeId](const Dictionary& tree) { return TypeIdOfDictionary(tree, typeId); });
+}
+
 bool LazyDict::GetTypeName(VekString* name) {
-  LazyNesting nesting;
-  LazyForm form = FormOf(*this, nesting);
-  VekString error;
-  switch (form.repM) {
-    case REP_PROTOBUF:
-    case REP_OBJECT: {
-      ref<SarnObject> object = form.repM == REP_OBJECT ? form.objectM : internal::ProtobufToObject(*this);
-      if (!object) return false;
-      if (name != nullptr) *name = object->GetTypeName();
-      return true;
-    }
-    case REP_BYTESOURCE:
-      BuildDictionaryFromBytesource();
-      return dictionaryM && TypeNameOfDictionary(*dictionaryM, name);
-    default: {
-      ref<Dictionary> tree = internal::TreeOf(*this, form, error, false);
-      return tree && TypeNameOfDictionary(*tree, name);
-    }
-  }
+  return AnswerTypeQuery(
+      *this,
+      [name](const SarnObject& object) {
+        if (name != nullptr) *name = object.GetTypeName();
+        return true;
+      },
+      [name](const Dictionary& tree) { return TypeNameOfDictionary(tree, name); });
 }
 
 ref<Dictionary> LazyDict::ToDictionary(VekString& error) const {
