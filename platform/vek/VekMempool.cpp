@@ -33,6 +33,29 @@ inline void Unpoison(const void*, size_t) {}
 #endif
 constexpr size_t kSpareLimitG = kIsRecyclingG ? VekMempool::kFreeSlabReserve : 0;
 
+// Slabs that pools gave back, kept for the next pool to take (at most 32, 2 MiB). A slab is
+// 64 KiB on a 64 KiB boundary, which the C library serves from a fresh mapping, so a program
+// that makes a pool per message would otherwise map and unmap its slabs for every message. The
+// slabs stay marked in the slab map while they wait here.
+constexpr size_t kSharedSlabLimitG = kIsRecyclingG ? 32 : 0;
+VekSpinLock sharedSlabLockG("VekMempool shared slabs", 1);
+void* vSharedSlabG[kSharedSlabLimitG > 0 ? kSharedSlabLimitG : 1];
+size_t nSharedSlabG = 0;
+
+void* TakeSharedSlab() {
+  if (kSharedSlabLimitG == 0) return nullptr;
+  VekSpinLockGuard guard(sharedSlabLockG);
+  return nSharedSlabG > 0 ? vSharedSlabG[--nSharedSlabG] : nullptr;
+}
+
+bool KeepSharedSlab(void* slab) {
+  if (kSharedSlabLimitG == 0) return false;
+  VekSpinLockGuard guard(sharedSlabLockG);
+  if (nSharedSlabG == kSharedSlabLimitG) return false;
+  vSharedSlabG[nSharedSlabG++] = slab;
+  return true;
+}
+
 // A large block starts with this header so that its payload keeps malloc's 16-byte alignment.
 struct LargeHeader {
   size_t nByteM;
@@ -279,11 +302,14 @@ VekMempool::Slab* VekMempool::TakeSlabLocked(size_t c) {
     pSpareM = slab->pNextM;
     --nSpareM;
   } else {
-    void* memory = std::aligned_alloc(kSlabBytes, kSlabBytes);
-    if (memory == nullptr) return nullptr;
-    if (!MarkSlab(memory, true)) {
-      std::free(memory);
-      return nullptr;
+    void* memory = TakeSharedSlab();
+    if (memory == nullptr) {
+      memory = std::aligned_alloc(kSlabBytes, kSlabBytes);
+      if (memory == nullptr) return nullptr;
+      if (!MarkSlab(memory, true)) {
+        std::free(memory);
+        return nullptr;
+      }
     }
     slab = new (memory) Slab;
     nSlabM.fetch_add(1, std::memory_order_relaxed);
@@ -300,10 +326,11 @@ VekMempool::Slab* VekMempool::TakeSlabLocked(size_t c) {
 }
 
 void VekMempool::ReleaseSlabLocked(Slab* slab) {
+  nSlabM.fetch_sub(1, std::memory_order_relaxed);
+  if (KeepSharedSlab(slab)) return;
   MarkSlab(slab, false);
   Unpoison(slab, kSlabBytes);
   std::free(slab);
-  nSlabM.fetch_sub(1, std::memory_order_relaxed);
 }
 
 void VekMempool::ReturnToSlabLocked(FreeNode* node) {

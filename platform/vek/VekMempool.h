@@ -11,7 +11,9 @@
 // per pool and class in front of the slabs (bounded; see kCacheBytesPerClass), so that the
 // common path of Malloc and Free takes no lock. A slab whose blocks are all free goes back to
 // the system, beyond a reserve of kFreeSlabReserve wholly free slabs per pool; every slab goes
-// back when the pool is destroyed. Larger blocks come from the C library with a 16-byte header
+// back when the pool is destroyed. "Back to the system" passes through one process-wide reserve
+// of 32 slabs (2 MiB) that new pools take from first, so that a program making a pool per
+// message does not map and unmap slabs for every message. Larger blocks come from the C library with a 16-byte header
 // and grow with its realloc, which moves pages rather than bytes for large blocks.
 //
 // Builds with AddressSanitizer recycle nothing: a freed small block is poisoned and never
