@@ -45,6 +45,20 @@ void StripKeys(Dict& headers, std::initializer_list<const VekString*> keys) {
   for (const VekString* key : keys) headers.Remove(*key);
 }
 
+// The shared step of both kinds' SetOptionalHeaders: a given Dict is stripped of the message's
+// own keys and held; a null one is replaced by a new empty Dict (kept as it was when memory runs
+// out).
+void AdoptHeaders(VekMempool* pool, ref<Dict>& held, ref<Dict>& given,
+                  std::initializer_list<const VekString*> ownKeys) {
+  if (!given) {
+    ref<Dict> fresh = MakeDict(pool);
+    if (fresh) held = fresh;
+    return;
+  }
+  StripKeys(*given, ownKeys);
+  held = given;
+}
+
 VekString Text(VekMempool* pool, const char* text) { return VekString::FromUtf8Bytes(pool, std::strlen(text), text); }
 
 // A pool that cannot make a string gives an empty one: a value that cannot be empty coming back
@@ -188,15 +202,10 @@ bool RequestWrapper::AddOptionalHeader(const VekString& key, const VekString& va
 }
 
 void RequestWrapper::SetOptionalHeaders(ref<Dict>& headers) {
-  if (!headers) {
-    ref<Dict> fresh = MakeDict(pMempoolM);
-    if (fresh) optionalHeadersM = fresh;
-    return;
-  }
   const internal::HeaderNames& n = internal::HeaderNames::Get();
-  StripKeys(*headers, {&n.requestTypeM, &n.schemaVersionM, &n.responseCountM, &n.typeM, &n.lowerTypeM, &n.rpcIdM,
-                       &n.contentTypeM});
-  optionalHeadersM = headers;
+  AdoptHeaders(pMempoolM, optionalHeadersM, headers,
+               {&n.requestTypeM, &n.schemaVersionM, &n.responseCountM, &n.typeM, &n.lowerTypeM, &n.rpcIdM,
+                &n.contentTypeM});
 }
 
 void RequestWrapper::SetOptionalHeaders(ref<Dictionary>& headers) {
@@ -285,14 +294,8 @@ bool ResponseWrapper::AddOptionalHeader(const VekString& key, const VekString& v
 }
 
 void ResponseWrapper::SetOptionalHeaders(ref<Dict>& headers) {
-  if (!headers) {
-    ref<Dict> fresh = MakeDict(pMempoolM);
-    if (fresh) optionalHeadersM = fresh;
-    return;
-  }
   const internal::HeaderNames& n = internal::HeaderNames::Get();
-  StripKeys(*headers, {&n.isFinalM, &n.typeM, &n.rpcIdM, &n.contentTypeM});
-  optionalHeadersM = headers;
+  AdoptHeaders(pMempoolM, optionalHeadersM, headers, {&n.isFinalM, &n.typeM, &n.rpcIdM, &n.contentTypeM});
 }
 
 void ResponseWrapper::SetOptionalHeaders(ref<Dictionary>& headers) {
