@@ -114,10 +114,7 @@ bool JsonSarnObject::Reader::AnyField(JsonSarnObject& self, int depth, InputPoin
 
 bool JsonSarnObject::UnmarshalAnyDict(int depth, InputPointerBytesource& input, ref<Dict>* result,
                                       VekString& error) {
-  if (Reader::State(*this) == nullptr) {
-    Append(pMempoolM, error, kOutOfMemoryMessage);
-    return false;
-  }
+  if (!Reader::Ready(*this, error)) return false;
   if (depth == 0) pReadStateM->isDepthRefusedM = false;
   dictvalue::Type type = dictvalue::TYPE_NONE;
   VekString text;
@@ -136,12 +133,12 @@ bool JsonSarnObject::UnmarshalAnyDict(InputPointerBytesource& input, ref<Dict>* 
 
 bool JsonSarnObject::UnmarshalAnyDictValue(int depth, InputPointerBytesource& input, dictvalue::Type& type,
                                            VekString& text, ref<Dict>& dict, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::AnyValue(*this, depth, input, type, text, dict, error);
+  return Reader::Ready(*this, error) && Reader::AnyValue(*this, depth, input, type, text, dict, error);
 }
 
 bool JsonSarnObject::UnmarshalAnyDictField(int depth, InputPointerBytesource& input, const ref<Dict>& dict,
                                            VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::AnyField(*this, depth, input, dict, error);
+  return Reader::Ready(*this, error) && Reader::AnyField(*this, depth, input, dict, error);
 }
 
 }  // namespace sarn

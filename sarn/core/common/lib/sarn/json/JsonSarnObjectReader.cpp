@@ -87,6 +87,12 @@ JsonSarnObject::ReadState* JsonSarnObject::Reader::State(JsonSarnObject& self) {
   return self.pReadStateM;
 }
 
+bool JsonSarnObject::Reader::Ready(JsonSarnObject& self, VekString& error) {
+  if (State(self) != nullptr) return true;
+  Append(self.pMempoolM, error, kOutOfMemoryMessage);
+  return false;
+}
+
 bool JsonSarnObject::Reader::TooDeep(JsonSarnObject& self, int level, VekString& error) {
   if (level <= self.limitsM.maxDepthM) return false;
   VekString message = VekString::Format(self.pMempoolM, kJsonDepthLimitFormat, self.limitsM.maxDepthM);
@@ -623,36 +629,32 @@ bool JsonSarnObject::JsonToSarnObject(const unsigned char* data, int length, Ker
 
 bool JsonSarnObject::Unmarshal(int depth, InputPointerBytesource& input, const StructInfo* type,
                                ref<SarnObject>* result, VekString& error) {
-  if (Reader::State(*this) == nullptr) {
-    Append(pMempoolM, error, kOutOfMemoryMessage);
-    return false;
-  }
-  return Reader::Object(*this, depth, input, type, result, error);
+  return Reader::Ready(*this, error) && Reader::Object(*this, depth, input, type, result, error);
 }
 
 bool JsonSarnObject::ReadFieldValue(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                     ref<SarnObject> object, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::Value(*this, depth, input, field, object.Get(), error);
+  return Reader::Ready(*this, error) && Reader::Value(*this, depth, input, field, object.Get(), error);
 }
 
 bool JsonSarnObject::UnmarshalOneSingleValue(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                              ref<SarnObject> object, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::Single(*this, depth, input, field, object.Get(), error);
+  return Reader::Ready(*this, error) && Reader::Single(*this, depth, input, field, object.Get(), error);
 }
 
 bool JsonSarnObject::UnmarshalOneMultiValue(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                             ref<SarnObject> object, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::Multi(*this, depth, input, field, object.Get(), error);
+  return Reader::Ready(*this, error) && Reader::Multi(*this, depth, input, field, object.Get(), error);
 }
 
 bool JsonSarnObject::ArrayValueFromJson(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                         ref<SarnObject> object, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::Array(*this, depth, input, field, object.Get(), error);
+  return Reader::Ready(*this, error) && Reader::Array(*this, depth, input, field, object.Get(), error);
 }
 
 bool JsonSarnObject::ArrayValueReadFieldValue(int depth, InputPointerBytesource& input, const FieldInfo* field,
                                               ref<SarnObject> object, VekString& error) {
-  return Reader::State(*this) != nullptr && Reader::Element(*this, depth, input, field, object.Get(), error);
+  return Reader::Ready(*this, error) && Reader::Element(*this, depth, input, field, object.Get(), error);
 }
 
 }  // namespace sarn

@@ -181,6 +181,8 @@ class __attribute__((visibility("hidden"))) JsonSarnObject::Reader {
   static bool TwoPass(JsonSarnObject& self, InputPointerBytesource& first, InputPointerBytesource& second,
                       ref<SarnObject>* result, VekString& error);
   static ReadState* State(JsonSarnObject& self);
+  // True when the read state exists; otherwise "Out of memory." is appended to `error`.
+  static bool Ready(JsonSarnObject& self, VekString& error);
 
  private:
   // One value of a field that holds no objects, converted and stored (a single field) or appended.
