@@ -3,48 +3,20 @@
 // object written as JSON, converted to a Dictionary and marshalled, and in version-1 envelopes),
 // random envelopes nesting payloads of every form through the binary form, and nesting past the limit.
 #include <functional>
-#include <memory>
 #include <regex>
 
 #include "runtime/DictTestSupport.h"
 #include "testutil/ObjectFill.h"
 #include "testutil/RandomObject.h"
+#include "testutil/TestStreams.h"
 
 namespace {
 
 using namespace dicttest;
 using LazyDictTest = sarntest::PoolTest;
 
-// A byte source over shared text whose duplicates each read it from the start, in pieces of at
-// most `pieceM` bytes; it counts the reads of the original, the duplicates made and the deletions.
-struct SourceCounts {
-  int ownReadsM = 0, duplicatesM = 0, deletedM = 0;
-};
-class CountingSource : public wynbaselib::Bytesource {
- public:
-  CountingSource(std::shared_ptr<const std::string> text, size_t piece, SourceCounts* counts, bool isOriginal = true,
-                 bool canDuplicate = true)
-      : textM(std::move(text)), pieceM(piece), pCountsM(counts), isOriginalM(isOriginal), canDuplicateM(canDuplicate) {}
-  ~CountingSource() override { ++pCountsM->deletedM; }
-  size_t Read(void* buffer, size_t size) override {
-    if (isOriginalM) ++pCountsM->ownReadsM;
-    size_t n = std::min({size, pieceM, textM->size() - atM});
-    std::memcpy(buffer, textM->data() + atM, n);
-    atM += n;
-    return n;
-  }
-  Bytesource* Duplicate() override {
-    if (!canDuplicateM) return nullptr;
-    ++pCountsM->duplicatesM;
-    return new CountingSource(textM, pieceM, pCountsM, false);
-  }
-
- private:
-  std::shared_ptr<const std::string> textM;
-  size_t pieceM, atM = 0;
-  SourceCounts* pCountsM;
-  bool isOriginalM, canDuplicateM;
-};
+// Byte sources deliver one byte per read and count duplicates, deletions and reads of the original.
+using SourceCounts = sarntest::PieceSource::Counters;
 
 std::string ObjectJson(VekMempool* pool, const ref<SarnObject>& object, KernoVersion version = 0) {
   return object ? Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), version)) : "null";
@@ -94,8 +66,7 @@ ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCount
                              .SarnObjectToDictionary(address.Get(), version);
   std::string json = ObjectJson(pool, address, version);
   auto source = [&](const std::string& text, bool canDuplicate) {
-    auto shared = std::make_shared<const std::string>(text);
-    return LazyDict::FromBytesource(pool, new CountingSource(shared, 1, counts, true, canDuplicate), version);
+    return LazyDict::FromBytesource(pool, new sarntest::PieceSource(text, 1, counts, canDuplicate), version);
   };
   if (form == "dict") return LazyDict::FromDict(pool, MempoolNew<Dict>(pool, tree), version);
   if (form == "json" || name == "logged") return LazyDict::FromJsonString(pool, Text(pool, json), version);
@@ -243,8 +214,8 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
     RunOperation(pool, payload, "type", counts);
     RunOperation(pool, payload, "type", counts);
     return "rep " + std::to_string(payload->repM) + (payload->pBytesourceM ? ", source" : "") +
-           (payload->dictionaryM ? ", tree" : "") + ", duplicates " + std::to_string(counts.duplicatesM) +
-           ", deleted " + std::to_string(counts.deletedM);
+           (payload->dictionaryM ? ", tree" : "") + ", duplicates " + std::to_string(counts.nDuplicatedM) +
+           ", deleted " + std::to_string(counts.nDeletedM);
   }
   if (op.rfind("wrapper", 0) == 0) {  // the body of a version-1 envelope: its bytes | what the envelope reader reads
     ref<SarnObject> envelope = StructInfoForId(std::stoul(op.substr(7)))->pFactory(pool), object;
@@ -296,9 +267,9 @@ TEST_F(LazyDictTest, EveryOperationOfEveryForm) {
                   payload->objectM.Get() == members[2] && payload->pBytesourceM == (isSwitched ? nullptr : members[3]));
       EXPECT_TRUE(payload->repM == rep || (rep == LazyDict::REP_BYTESOURCE && payload->repM == LazyDict::REP_DICTIONARY));
       EXPECT_TRUE(rep != LazyDict::REP_BYTESOURCE || isQuery || !payload->dictionaryM);
-      EXPECT_EQ(counts.ownReadsM, 0);
+      EXPECT_EQ(counts.nOwnReadsM, 0);
     }
-    EXPECT_EQ(counts.deletedM, counts.duplicatesM + (row[0].find("ource") != std::string::npos || row[0] == "noDuplicate"));
+    EXPECT_EQ(counts.nDeletedM, counts.nDuplicatedM + (row[0].find("ource") != std::string::npos || row[0] == "noDuplicate"));
   }
 }
 

@@ -100,17 +100,26 @@ class PieceSource : public wynbaselib::InMemoryBytestream {
   struct Counters {
     int nDuplicatedM = 0;
     int nDeletedM = 0;
+    int nOwnReadsM = 0;  // reads of the source first made, not of its duplicates
   };
-  PieceSource(const std::string& text, size_t piece, Counters* counters = nullptr)
-      : InMemoryBytestream(text), pieceM(piece), pCountersM(counters) {}
-  PieceSource(const PieceSource& other) = default;
+  PieceSource(const std::string& text, size_t piece, Counters* counters = nullptr, bool canDuplicate = true)
+      : InMemoryBytestream(text), pieceM(piece), pCountersM(counters), canDuplicateM(canDuplicate) {}
+  PieceSource(const PieceSource& other)
+      : InMemoryBytestream(other),
+        pieceM(other.pieceM),
+        pCountersM(other.pCountersM),
+        isOriginalM(false),
+        canDuplicateM(other.canDuplicateM) {}
   ~PieceSource() override {
     if (pCountersM != nullptr) ++pCountersM->nDeletedM;
   }
   size_t Read(void* buffer, size_t size) override {
+    if (pCountersM != nullptr && isOriginalM) ++pCountersM->nOwnReadsM;
     return InMemoryBytestream::Read(buffer, pieceM != 0 ? std::min(size, pieceM) : size);
   }
+  // Null when made unable to duplicate.
   Bytesource* Duplicate() override {
+    if (!canDuplicateM) return nullptr;
     if (pCountersM != nullptr) ++pCountersM->nDuplicatedM;
     return new PieceSource(*this);
   }
@@ -118,6 +127,8 @@ class PieceSource : public wynbaselib::InMemoryBytestream {
  private:
   size_t pieceM;
   Counters* pCountersM;
+  bool isOriginalM = true;
+  bool canDuplicateM;
 };
 
 // A sink that keeps what it is given; with `fFailM` set every write and flush fails.
