@@ -64,10 +64,8 @@ TEST(KernoRpcV2Convert, BodiesAndHeadersAreSharedNotCopied) {
   auto* v1Request = static_cast<sarnschema::KernoRpcRequest*>(v1.Get());
   auto* v2Response = static_cast<ResponseWrapper*>(v2.Get());
   EXPECT_TRUE(v1Request->requestM == body && v1Request->headersM == headers && v2Response->bodyM == body && v2Response->optionalHeadersM == headers);
-  ProtoBufByteOutputStream out;  // an envelope with headers, refused by the envelope reader
-  ProtoBuf codec(&pool, Schema::vStructDefG, Schema::nStructDefG);
-  codec.MarshalKnownDict(v1.Get(), &out);
-  const std::string bytes = sarntest::Finished(out);
-  ref<SarnObject> read = codec.UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
+  // An envelope with headers, refused by the envelope reader.
+  const std::string bytes = sarntest::KnownDictBytes(&pool, v1.Get());
+  ref<SarnObject> read = ProtoBuf(&pool, Schema::vStructDefG, Schema::nStructDefG).UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
   EXPECT_EQ(Str(static_cast<sarnschema::Error*>(read.Get())->textM), "wrapper did not unmarshal");
 }

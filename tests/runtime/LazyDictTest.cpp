@@ -22,18 +22,8 @@ std::string ObjectJson(VekMempool* pool, const ref<SarnObject>& object, KernoVer
   return object ? Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), version)) : "null";
 }
 
-std::string BinaryOf(VekMempool* pool, const SarnObject* object) {
-  ProtoBufByteOutputStream stream;
-  ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG).MarshalKnownDict(object, &stream);
-  return sarntest::Finished(stream);
-}
-
-ref<SarnObject> ReadBinary(VekMempool* pool, const std::string& bytes) {
-  ref<SarnObject> object;
-  ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG)
-      .UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &object);
-  return object;
-}
+using sarntest::KnownDictBytes;
+using sarntest::ReadKnownDict;
 
 std::string Hex(const std::string& bytes) {
   std::string out;
@@ -70,7 +60,7 @@ ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCount
   };
   if (form == "dict") return LazyDict::FromDict(pool, MempoolNew<Dict>(pool, tree), version);
   if (form == "json" || name == "logged") return LazyDict::FromJsonString(pool, Text(pool, json), version);
-  if (form == "pb") return LazyDict::FromJsonString(pool, Text(pool, BinaryOf(pool, address.Get())), version);
+  if (form == "pb") return LazyDict::FromJsonString(pool, Text(pool, KnownDictBytes(pool, address.Get())), version);
   if (form == "object" || name == "longObject") return LazyDict::FromSarnObject(pool, address, version);
   if (form == "dictionary") return LazyDict::FromDictionary(pool, tree, version);
   if (form == "source" || name == "longSource" || name == "loggedSource") return source(json, true);
@@ -221,15 +211,15 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
     ref<SarnObject> envelope = StructInfoForId(std::stoul(op.substr(7)))->pFactory(pool), object;
     const FieldInfo& body = envelope->GetStructInfo()->vFieldInfo[2];  // in each of the three
     FieldAccess::PutReference(envelope.Get(), body, payload.Get());
-    std::string bytes = BinaryOf(pool, envelope.Get());
+    std::string bytes = KnownDictBytes(pool, envelope.Get());
     ref<SarnObject> read = ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG)
                                .UnmarshalWrapper(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()));
     // As a known dict the body stays unparsed bytes that convert to the payload's object.
-    ref<SarnObject> back = ReadBinary(pool, bytes);
+    ref<SarnObject> back = ReadKnownDict(pool, bytes);
     auto* unparsed = static_cast<LazyDict*>(FieldAccess::ReferenceAt(back.Get(), body, 0));
     EXPECT_TRUE(unparsed->repM == LazyDict::REP_PROTOBUF && *unparsed->ToSarnObjectOrError() == *payload->ToSarnObjectOrError());
     EXPECT_TRUE(!payload->ToSarnObject(object) || *back == *envelope);
-    return Hex(bytes) + " | " + (BinaryOf(pool, read.Get()) == bytes ? "same" : ObjectJson(pool, read));
+    return Hex(bytes) + " | " + (KnownDictBytes(pool, read.Get()) == bytes ? "same" : ObjectJson(pool, read));
   }
   // The payload in a request: written as JSON; converted to a Dictionary (the payload shared)
   // and back; marshalled and read back, the payload then unparsed bytes converted to an object.
@@ -243,7 +233,7 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
     EXPECT_EQ(static_cast<sarnschema::KernoRpcRequest*>(back.Get())->requestM.Get(), payload.Get()) << "shared";
     return Compact(tree);
   }
-  ref<SarnObject> back = ReadBinary(pool, BinaryOf(pool, request.Get()));
+  ref<SarnObject> back = ReadKnownDict(pool, KnownDictBytes(pool, request.Get()));
   EXPECT_TRUE(back);
   const ref<LazyDict>& read = static_cast<sarnschema::KernoRpcRequest*>(back.Get())->requestM;
   EXPECT_EQ(read->repM, LazyDict::REP_PROTOBUF);
@@ -301,9 +291,9 @@ TEST_F(LazyDictTest, RandomEnvelopesWithPayloadsInEveryFormTravelUnparsed) {
   for (int i = 0; i < 300 && !HasFatalFailure(); ++i) {
     ref<SarnObject> object = random.Make(i % 3 == 2 ? 2238 : 975 + i % 3);
     reform(object.Get());
-    std::string bytes = BinaryOf(&poolM, object.Get());
-    ref<SarnObject> back = ReadBinary(&poolM, bytes);
-    ASSERT_TRUE(back && *back == *object && *object == *back && BinaryOf(&poolM, back.Get()) == bytes) << i;
+    std::string bytes = KnownDictBytes(&poolM, object.Get());
+    ref<SarnObject> back = ReadKnownDict(&poolM, bytes);
+    ASSERT_TRUE(back && *back == *object && *object == *back && KnownDictBytes(&poolM, back.Get()) == bytes) << i;
     expectUnparsed(object.Get(), back.Get());
   }
   EXPECT_GT(nextForm, 600);
@@ -369,7 +359,7 @@ void PrependVarint(std::string& reversed, size_t value) {
 // Protocol-buffer bytes of a kernoRpcRequest whose request holds another one, `depth` times, around
 // an address: each level's bytes are the known dict (tag, length) of its fields, the lazy last.
 std::string NestedRequests(VekMempool* pool, int depth) {
-  std::string innermost = BinaryOf(pool, Address(pool).Get());
+  std::string innermost = KnownDictBytes(pool, Address(pool).Get());
   std::string reversed(innermost.rbegin(), innermost.rend());
   for (int level = 0; level < depth; ++level) {
     size_t inner = reversed.size();
@@ -405,7 +395,7 @@ TEST_F(LazyNestingTest, PayloadsNestedPastTheLimitConvertOnASmallStack) {
     }
     ref<SarnObject> object = payload->ToSarnObjectOrError();
     ASSERT_EQ(Str(object->GetTypeName()), "kernoRpcRequest");
-    std::string binary = BinaryOf(&poolM, object.Get());
+    std::string binary = KnownDictBytes(&poolM, object.Get());
     EXPECT_EQ(Count(binary, limit), 1u);
     // The object and the 512 payloads around which the binary writer counts its levels.
     EXPECT_EQ(Count(binary, std::string("\xfa\x3c", 2)), 513u);

@@ -24,13 +24,7 @@ inline ref<SarnObject> FromJson(VekMempool* pool, const std::string& json) {
 }
 
 inline ref<SarnObject> BinaryCopy(VekMempool* pool, const SarnObject* object) {
-  ProtoBuf codec(pool, Schema::vStructDefG, Schema::nStructDefG);
-  ProtoBufByteOutputStream out;
-  codec.MarshalKnownDict(object, &out);
-  const std::string bytes = sarntest::Finished(out);
-  ref<SarnObject> copy;
-  codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &copy);
-  return copy;
+  return sarntest::ReadKnownDict(pool, sarntest::KnownDictBytes(pool, object));
 }
 
 inline const FieldInfo* FieldNamed(const StructInfo* info, const std::string& name) {

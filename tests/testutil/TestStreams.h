@@ -39,6 +39,21 @@ inline std::string Finished(sarn::ProtoBufByteOutputStream& stream) {
   return std::string(reinterpret_cast<const char*>(data), length);
 }
 
+// The binary form of `object` as a known dict (the registry's tables).
+inline std::string KnownDictBytes(VekMempool* pool, const sarn::SarnObject* object) {
+  sarn::ProtoBufByteOutputStream stream;
+  sarn::ProtoBuf(pool, sarn::Schema::vStructDefG, sarn::Schema::nStructDefG).MarshalKnownDict(object, &stream);
+  return Finished(stream);
+}
+
+// A known dict read back from `bytes`; null when refused.
+inline ref<sarn::SarnObject> ReadKnownDict(VekMempool* pool, const std::string& bytes) {
+  ref<sarn::SarnObject> object;
+  sarn::ProtoBuf(pool, sarn::Schema::vStructDefG, sarn::Schema::nStructDefG)
+      .UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()), static_cast<int>(bytes.size()), &object);
+  return object;
+}
+
 // Splits `input` into chunks of `size` bytes (the last one shorter).
 inline std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
   std::vector<std::string_view> chunks;
