@@ -3,14 +3,8 @@
 // data) finishes exactly as a plain length-prefix encoder writes the same tree; the
 // varint readers never step outside the input, leave cursor and value alone when they fail, and
 // read back what the writers wrote for the value they found.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
 #include <utility>
-#include <vector>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 

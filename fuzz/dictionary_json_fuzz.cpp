@@ -4,7 +4,6 @@
 // Oracles: a verdict with a message exactly on failure; writing an accepted tree compact and
 // pretty and reading it back gives an equal tree; where the streaming parser accepts the same
 // text and it holds no escapes, both trees are equal; the pool is empty afterwards.
-#include <cstring>
 
 #include "DictFuzzSupport.h"
 

@@ -2,16 +2,10 @@
 // zlib's memory comes from a pool; the rest is the stream. Oracles: reading in small pieces
 // gives the same bytes and the same verdict as one large read, a duplicate made after the
 // first read gives the same rest, and the pool gets every byte back.
-#include <cstdint>
 #include <cstdio>
-#include <cstdlib>
-#include <cstring>
 #include <memory>
-#include <string>
 
-#include "vek/VekMempool.h"
-#include "wynbaselib/Gzip.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 

@@ -3,12 +3,7 @@
 // both readers succeed on a closed string (or a bare token) they give the same text and stop
 // at the same byte; the two writers give the same bytes; a text without control bytes reads
 // back as itself.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 using sarntest::Require;
 using sarntest::Str;

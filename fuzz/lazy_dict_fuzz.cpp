@@ -4,34 +4,14 @@
 // Oracle: no crash, leak or hang; ToSarnObjectOrError never null; ToProtobuf always reads back as
 // a known dict; the form unchanged but for a type query's switch; and a byte source answers like a
 // JSON payload of the same bytes whenever both JSON readers make the same tree of them.
-#include <cstdint>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
 using namespace sarn;
+using sarntest::PieceSource;
 using sarntest::Require;
 using sarntest::Str;
-
-// Hands out a shared text in pieces; its duplicates start again at the first byte.
-class PieceSource : public wynbaselib::Bytesource {
- public:
-  PieceSource(const std::string& text, size_t piece) : textM(text), pieceM(piece) {}
-  size_t Read(void* buffer, size_t size) override {
-    size_t n = std::min({size, pieceM, textM.size() - atM});
-    std::memcpy(buffer, textM.data() + atM, n);
-    atM += n;
-    return n;
-  }
-  Bytesource* Duplicate() override { return new PieceSource(textM, pieceM); }
-
- private:
-  const std::string& textM;
-  size_t pieceM, atM = 0;
-};
 
 // Everything a payload answers, as text; each form's type queries last, since they may switch it.
 std::string Answers(VekMempool* pool, LazyDict& payload) {

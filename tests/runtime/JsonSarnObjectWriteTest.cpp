@@ -8,8 +8,7 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
-#include "testutil/ObjectFill.h"
-#include "testutil/TestUtil.h"
+#include "runtime/ObjectOpsSupport.h"
 
 namespace {
 
@@ -101,36 +100,19 @@ TEST_F(JsonWriteTest, DefaultTestAllTypesWritesEveryRequiredForm) {
             "\"idLongAndType\": \"\", \"uri\": \"\", \"bytestring\": \"\", \"idAnyBody\": \"\", \"type\": \"testAllTypes\"}");
 }
 
-TEST_F(JsonWriteTest, ValuesOfOptionalAndMultiFields) {
-  ref<SarnObject> object = sarnschema::Success::Factory(&poolM);
-  ref<SarnObject> all = sarnschema::TestAllTypes::Factory(&poolM);
-  auto* t = static_cast<sarnschema::TestAllTypes*>(all.Get());
-  for (int v : {1, 2, 3}) t->intMultiM.Add(&v);
-  t->longOptionalM = -1;
-  t->enumOptionalM = 9;
-  t->floatOptionalM = 123456789.0;
-  t->stringOptionalM = VekString::FromUtf8Bytes(&poolM, 9, "q\"b\\t\tu\\u");
-  t->idLongOptionalM = (5ull << 48) + 12;
-  t->fHasLongOptionalM = t->fHasEnumOptionalM = t->fHasFloatOptionalM = t->fHasStringOptionalM =
-      t->fHasIdLongOptionalM = true;
-  uint8_t flags[] = {1, 0};
-  t->booleanMultiM.Add(&flags[0]);
-  t->booleanMultiM.Add(&flags[1]);
-  // Null elements of an array of objects are left out; an array of only nulls is no array.
-  t->structMultiM.Add(nullptr);
-  t->structMultiM.Add(object.Get());
-  t->structMultiM.Add(nullptr);
-  t->unionMultiM.Add(nullptr);
-  std::string json = Write(t, 0);
-  for (const char* part : {"\"booleanMulti\": [true,false]", "\"enumOptional\": \"INVALID_VALUE:9\"",
-                           "\"floatOptional\": \"1.2345679e+08\"", "\"idLongOptional\": \"vask:ct.tms.ep.12\"",
-                           "\"intMulti\": [1,2,3]", "\"longOptional\": \"-1\"",
-                           "\"stringOptional\": \"q\\\"b\\\\t\\tu\\u\"",
-                           "\"structMulti\": [{\"type\": \"success\"}], \"time\""}) {
-    EXPECT_NE(json.find(part), std::string::npos) << part << " in " << json;
+TEST_F(JsonWriteTest, FieldValuesFromTable) {
+  for (const auto& row : sarntest::ReadTable("json/object-writes.txt", 3)) {
+    const FieldInfo* field;
+    const std::string json = Write(objopstest::Side(&poolM, row[0], row[1], field).Get(), 0);
+    const std::string name = "\"" + row[0].substr(row[0].find('.') + 1) + "\": ";
+    EXPECT_EQ(json.find(row[2] == "-" ? name : row[2]) == std::string::npos, row[2] == "-") << row[0] << ": " << json;
   }
-  EXPECT_EQ(json.find("unionMulti"), std::string::npos) << json;
-  EXPECT_EQ(json.find("\"stringMulti\""), std::string::npos) << json;
+  // Null elements of an array of objects are left out, and the commas stay right.
+  ref<SarnObject> all = sarnschema::TestAllTypes::Factory(&poolM), object = sarnschema::Success::Factory(&poolM);
+  for (SarnObject* element : {static_cast<SarnObject*>(nullptr), object.Get(), static_cast<SarnObject*>(nullptr)}) {
+    static_cast<sarnschema::TestAllTypes*>(all.Get())->structMultiM.Add(element);
+  }
+  EXPECT_NE(Write(all.Get(), 0).find("\"structMulti\": [{\"type\": \"success\"}], \"time\""), std::string::npos);
 }
 
 // The writer forms dates, times and ids itself; they must be the bytes of the types' own text.
@@ -187,8 +169,8 @@ TEST_F(JsonWriteTest, LazyPayloadsWriteThemselvesAndObjectsTheirOwnVersion) {
 }
 
 // A chain of errors 100,000 deep, each the cause of the next, through both writers that walk
-// objects into bytes: exact lengths and both ends. With the writer's pool refusing the first
-// growth of the walk's stack, each reports the failure instead of writing on.
+// objects into bytes, exactly. With the writer's pool refusing the first growth of the walk's
+// stack, each reports the failure instead of writing on.
 TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
   const int kDepth = 100000;
   std::vector<ref<SarnObject>> chain;
@@ -197,52 +179,42 @@ TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
     static_cast<sarnschema::Error*>(chain.back().Get())->codeM = 3;
     if (i > 0) static_cast<sarnschema::Error*>(chain[i - 1].Get())->causeM = chain.back();
   }
-  auto varintLength = [](size_t n) { return sarntest::Varint(n).size(); };
-  struct Writer {
-    const char* label;
-    std::function<bool(VekMempool*, std::string&)> write;
-    size_t size;
-    std::string head, tail;
-  };
   // Fields in number order: code, debug, text, retryInterval, cause, traceInfo ("type" before it).
-  const std::string jsonHead = "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
-  const std::string jsonLast = "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
-  const std::string jsonTail = ", \"type\": \"error\"}";
+  std::string json;
+  for (int i = 1; i < kDepth; ++i) json += "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
+  json += "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
+  for (int i = 1; i < kDepth; ++i) json += ", \"type\": \"error\"}";
   // Binary: code (08 03), text (1A 00), then cause (2A) holding the known dict of type 346 (D2 15).
-  size_t fields = 4;
+  objopstest::InsideOut binary(std::string("\xD2\x15\x04\x08\x03\x1A\x00", 7));
   for (int i = 1; i < kDepth; ++i) {
-    size_t known = 2 + varintLength(fields) + fields;
-    fields = 4 + 1 + varintLength(known) + known;
+    binary.Prepend("\x2A" + sarntest::Varint(binary.reversedM.size()));
+    binary.Prepend(std::string("\x08\x03\x1A\x00", 4));
+    binary.Prepend("\xD2\x15" + sarntest::Varint(binary.reversedM.size()));
   }
-  const Writer writers[] = {
-      {"json",
-       [&](VekMempool* pool, std::string& text) {
-         JsonSarnObject json(pool);
+  const std::pair<std::function<bool(VekMempool*, std::string&)>, std::string> writers[] = {
+      {[&](VekMempool* pool, std::string& text) {
          ByteBuffer out(&poolM);
-         bool ok = json.SarnObjectToJson(chain.front().Get(), 0, out);
+         bool ok = JsonSarnObject(pool).SarnObjectToJson(chain.front().Get(), 0, out);
          text.assign(reinterpret_cast<const char*>(out.GetData()), out.GetLength());
          return ok;
        },
-       (kDepth - 1) * (jsonHead.size() + jsonTail.size()) + jsonLast.size(), jsonHead, jsonTail},
-      {"binary",
-       [&](VekMempool* pool, std::string& bytes) {
+       json},
+      {[&](VekMempool* pool, std::string& bytes) {
          ProtoBufByteOutputStream out;
          ProtoBuf(pool, Schema::vStructDefG, Schema::nStructDefG).MarshalKnownDict(chain.front().Get(), &out);
          bytes = sarntest::Finished(out);
          return !out.IsOutOfMemory();
        },
-       2 + varintLength(fields) + fields, "\xD2\x15", std::string("\xD2\x15\x04\x08\x03\x1A\x00", 7)},
+       binary.Bytes()},
   };
-  for (const Writer& w : writers) {
+  for (const auto& [write, expected] : writers) {
     std::string out;
-    ASSERT_TRUE(w.write(&poolM, out)) << w.label;
-    ASSERT_EQ(out.size(), w.size) << w.label;
-    EXPECT_EQ(out.compare(0, w.head.size(), w.head), 0) << w.label;
-    EXPECT_EQ(out.compare(out.size() - w.tail.size(), w.tail.size(), w.tail), 0) << w.label;
+    ASSERT_TRUE(write(&poolM, out));
+    EXPECT_TRUE(out == expected) << (&expected == &writers[0].second ? "json" : "binary") << " wrote " << out.size() << " bytes";
     VekMempool failing("failing");
     failing.FailAllocationAfter(0);
-    EXPECT_FALSE(w.write(&failing, out)) << w.label;
-    EXPECT_EQ(failing.GetUsedBytes(), 0u) << w.label;
+    EXPECT_FALSE(write(&failing, out));
+    EXPECT_EQ(failing.GetUsedBytes(), 0u);
   }
   // Released from the top so that no destructor recurses through the chain.
   for (auto& link : chain) link.Reset();

@@ -18,14 +18,6 @@ std::string Summary(VekMempool* pool, const ref<KernoRpcWrapper>& w) {
   return Str(w->ToString(pool)) + " v" + std::to_string(w->schemaVersionM) + (body ? "/" + std::to_string(body->versionM) : "");
 }
 
-// The wrappers' own operator== for two of one kind.
-bool SameWrapper(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-  auto *ra = dynamic_cast<RequestWrapper*>(a.Get()), *rb = dynamic_cast<RequestWrapper*>(b.Get());
-  auto *sa = dynamic_cast<ResponseWrapper*>(a.Get()), *sb = dynamic_cast<ResponseWrapper*>(b.Get());
-  auto *ca = dynamic_cast<CancelWrapper*>(a.Get()), *cb = dynamic_cast<CancelWrapper*>(b.Get());
-  return (ra && rb && *ra == *rb) || (sa && sb && *sa == *sb) || (ca && cb && *ca == *cb);
-}
-
 }  // namespace
 
 // Rows: an envelope as JSON (its body at version 33) => the wrapper it gives => the envelope that

@@ -6,6 +6,7 @@
 #include <regex>
 
 #include "runtime/DictTestSupport.h"
+#include "runtime/ObjectOpsSupport.h"
 #include "testutil/ObjectFill.h"
 #include "testutil/RandomObject.h"
 #include "testutil/TestStreams.h"
@@ -106,13 +107,6 @@ void CaptureLine(int facility, int priority, const char* tag, const char* line) 
   // The figures and the time vary from run to run; the rest of the line is exact.
   *gLogG += std::to_string(facility) + " " + std::to_string(priority) + " " + tag + " " +
             std::regex_replace(line, std::regex(R"(\((\d+)/(\d+)\)|elapsedTime [0-9.]+(ns|us|ms|s)$)"), "#") + "; ";
-}
-
-// The request of a kernoRpcRequest holding `payload`.
-ref<SarnObject> InRequest(VekMempool* pool, const ref<LazyDict>& payload) {
-  ref<SarnObject> request = sarnschema::KernoRpcRequest::Factory(pool);
-  static_cast<sarnschema::KernoRpcRequest*>(request.Get())->requestM = payload;
-  return request;
 }
 
 std::string WithFeature(bool isDirect, const std::function<std::string()>& work) {
@@ -223,7 +217,8 @@ std::string RunOperation(VekMempool* pool, const ref<LazyDict>& payload, const s
   }
   // The payload in a request: written as JSON; converted to a Dictionary (the payload shared)
   // and back; marshalled and read back, the payload then unparsed bytes converted to an object.
-  ref<SarnObject> request = InRequest(pool, payload);
+  ref<SarnObject> request = sarnschema::KernoRpcRequest::Factory(pool);
+  static_cast<sarnschema::KernoRpcRequest*>(request.Get())->requestM = payload;
   if (op == "inJson") return ObjectJson(pool, request, payload->versionM);
   DictionarySarnObject converter(pool, Schema::vStructDefG, Schema::nStructDefG);
   if (op == "inDictionary") {
@@ -300,20 +295,19 @@ TEST_F(LazyDictTest, RandomEnvelopesWithPayloadsInEveryFormTravelUnparsed) {
 }
 
 TEST_F(LazyDictTest, FirstByteChoosesTheForm) {
-  // A '{' (after blanks) is JSON, anything else protocol-buffer bytes; nothing, or a NUL first, no payload.
+  // A '{' (after spaces) is JSON, anything else protocol-buffer bytes; nothing, or a NUL first, no
+  // payload. Only the first byte decides, and a byte string is shared.
   std::string forms;
-  for (const char* text : {"{}", " {}", "\n{}", "[1]", ""}) {
-    ref<LazyDict> payload = LazyDict::FromJsonString(&poolM, VekString(text), 7);
-    forms += !payload ? "none " : payload->repM == LazyDict::REP_JSON ? "json " : payload->repM == LazyDict::REP_PROTOBUF ? "pb " : "? ";
+  for (const std::string& text : std::vector<std::string>{"{}", " {}", "\n{}", "[1]", "", "\x7B\x08\x01", std::string("\0{", 2)}) {
+    ref<vek::ByteBuffer> bytes = vek::ByteBuffer::New(&poolM, text.data(), text.size());
+    for (ref<LazyDict> payload : {LazyDict::FromJsonString(&poolM, Text(&poolM, text), 9), LazyDict::FromBytestring(&poolM, bytes, 9)}) {
+      forms += !payload ? "none " : payload->repM == LazyDict::REP_JSON ? "json " : payload->repM == LazyDict::REP_PROTOBUF ? "pb " : "? ";
+      EXPECT_TRUE(!payload || (payload->versionM == 9 && !payload->dictionaryM));
+    }
+    EXPECT_TRUE(text.empty() || text[0] == '\0' || LazyDict::FromBytestring(&poolM, bytes, 9)->bytesM.Get() == bytes.Get());
   }
-  EXPECT_EQ(forms, "json json pb pb none ");
-  EXPECT_FALSE(LazyDict::FromBytestring(&poolM, vek::ByteBuffer::New(&poolM, "\0{", 2), 7));
+  EXPECT_EQ(forms, "json json json json pb pb pb pb none none json json none none ");
   EXPECT_FALSE(LazyDict::FromBytestring(&poolM, ref<vek::ByteBuffer>(), 7));
-  ref<vek::ByteBuffer> bytes = vek::ByteBuffer::New(&poolM, "\x7B\x08\x01", 3);
-  ref<LazyDict> payload = LazyDict::FromBytestring(&poolM, bytes, 9);
-  EXPECT_EQ(payload->repM, LazyDict::REP_JSON) << "only the first byte decides";
-  EXPECT_TRUE(payload->bytesM.Get() == bytes.Get() && payload->versionM == 9 && !payload->dictionaryM)
-      << "the buffer is shared";
 }
 
 TEST_F(LazyDictTest, PayloadsInsideTreesWriteAndCompareAsPayloads) {
@@ -347,28 +341,15 @@ namespace {
 using namespace dicttest;
 using LazyNestingTest = sarntest::PoolTest;
 
-void PrependVarint(std::string& reversed, size_t value) {
-  std::string bytes;
-  do {
-    bytes += static_cast<char>((value & 0x7f) | (value > 0x7f ? 0x80 : 0));
-    value >>= 7;
-  } while (value != 0);
-  reversed.append(bytes.rbegin(), bytes.rend());
-}
-
 // Protocol-buffer bytes of a kernoRpcRequest whose request holds another one, `depth` times, around
 // an address: each level's bytes are the known dict (tag, length) of its fields, the lazy last.
 std::string NestedRequests(VekMempool* pool, int depth) {
-  std::string innermost = KnownDictBytes(pool, Address(pool).Get());
-  std::string reversed(innermost.rbegin(), innermost.rend());
+  objopstest::InsideOut bytes(KnownDictBytes(pool, Address(pool).Get()));
   for (int level = 0; level < depth; ++level) {
-    size_t inner = reversed.size();
-    PrependVarint(reversed, inner);
-    reversed += std::string("\x12\x00\x20\x00\x18\x00\x08", 7);
-    PrependVarint(reversed, reversed.size());  // the fields' length: everything so far
-    reversed += "\x3c\xfa";
+    bytes.Prepend(std::string("\x08\x00\x18\x00\x20\x00\x12", 7) + sarntest::Varint(bytes.reversedM.size()));
+    bytes.Prepend("\xfa\x3c" + sarntest::Varint(bytes.reversedM.size()));
   }
-  return std::string(reversed.rbegin(), reversed.rend());
+  return bytes.Bytes();
 }
 
 size_t Count(const std::string& text, const std::string& what) {
