@@ -1,6 +1,6 @@
 // The message readers. Byte 0: the byte-source reader's setting (low bits, modulo 3) and, in bit
 // 7, whether the rest is a frame as it stands or parts assembled into a frame of the writers'
-// form; bytes 1 and 2: two chunk sizes used in turn (1 to 64 bytes). Oracles: the byte-source reader gives the
+// form; bytes 1 and 2: two chunk sizes used in turn (0 for 1). Oracles: the byte-source reader gives the
 // same verdict and message whole and in chunks; on assembled frames what it accepts the string
 // reader accepts too, with the same kind, members, optional headers and body bytes; every
 // accepted wrapper written again reads back equal.
@@ -97,7 +97,12 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const auto setting = static_cast<KernoRpcV2BytestreamImpl::LazinessSettings>((data[0] & 0x7f) % 3);
   const std::string rest(reinterpret_cast<const char*>(data + 3), size - 3);
   const std::string frame = (data[0] & 0x80) != 0 ? Assemble(rest) : rest;
-  const auto chunks = dictfuzz::Chunks(reinterpret_cast<const uint8_t*>(frame.data()), frame.size(), data + 1, 2);
+  std::vector<std::string_view> chunks;
+  for (size_t at = 0, turn = 0; at < frame.size(); ++turn) {
+    size_t n = std::min<size_t>(data[1 + turn % 2] == 0 ? 1 : data[1 + turn % 2], frame.size() - at);
+    chunks.push_back(std::string_view(frame).substr(at, n));
+    at += n;
+  }
   VekString wholeError, chunkError, stringError;
   sarntest::TestSource whole({frame}), pieces(chunks);
   ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), whole, setting, wholeError);

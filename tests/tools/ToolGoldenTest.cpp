@@ -3,7 +3,6 @@
 // from `stdin` (or nothing), and its standard output, standard error and exit status are compared
 // byte for byte with the files `stdout`, `stderr` and `status` (a missing file means empty, or 0).
 // SARN_UPDATE_GOLDEN=1 writes what the programs did into those files instead, for review.
-#include <dirent.h>
 #include <unistd.h>
 #include <sys/wait.h>
 
@@ -27,11 +26,9 @@ std::string CasesDir() {
 
 std::vector<std::string> CaseNames() {
   std::vector<std::string> names;
-  if (DIR* dir = opendir(CasesDir().c_str())) {
-    while (dirent* entry = readdir(dir)) {
-      if (entry->d_name[0] != '.') names.push_back(entry->d_name);
-    }
-    closedir(dir);
+  std::error_code error;
+  for (const auto& entry : std::filesystem::directory_iterator(CasesDir(), error)) {
+    if (entry.path().filename().string()[0] != '.') names.push_back(entry.path().filename().string());
   }
   std::sort(names.begin(), names.end());
   return names;
@@ -45,11 +42,8 @@ std::string ReadOrEmpty(const std::string& path) {
 
 // Writes `text` to `path`, or removes the file when the text is the default (empty).
 void WriteGolden(const std::string& path, const std::string& text) {
-  if (text.empty()) {
-    std::remove(path.c_str());
-    return;
-  }
-  std::ofstream(path, std::ios::binary) << text;
+  if (text.empty()) std::remove(path.c_str());
+  else std::ofstream(path, std::ios::binary) << text;
 }
 
 class ToolGolden : public ::testing::TestWithParam<std::string> {};
