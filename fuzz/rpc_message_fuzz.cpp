@@ -5,6 +5,7 @@
 // reader accepts too, with the same kind, members, optional headers and body bytes; every
 // accepted wrapper written again reads back equal.
 #include "DictFuzzSupport.h"
+#include "RpcFuzzSupport.h"
 
 namespace {
 
@@ -44,50 +45,18 @@ std::string Assemble(const std::string& rest) {
   return "MRPC/2 " + std::to_string(block.size()) + " " + std::to_string(parts[7].size()) + "\r\n" + block + parts[7];
 }
 
-std::string BodyBytes(const ref<LazyDict>& body) {
-  if (!body || body->repM != LazyDict::REP_BYTESOURCE) return body ? Str(body->ToJson(false)) : "";
-  wynbaselib::Bytesource* copy = body->pBytesourceM->Duplicate();
-  std::string all(512, '\0');
-  size_t used = 0;
-  for (size_t n; (n = copy->Read(&all[used], all.size() - used)) != 0; all.resize(all.size() * 2)) used += n;
-  delete copy;
-  return all.substr(0, used);
-}
-
-// The kind, typed members, optional headers and (unless parsed) body bytes of a wrapper.
-std::string Summary(const ref<KernoRpcWrapper>& w, bool withBody) {
-  std::string text = Str(w->HeadersToDict(Pool())->ToString(false)) + " v" + std::to_string(w->schemaVersionM);
-  if (auto* q = dynamic_cast<RequestWrapper*>(w.Get())) {
-    text += " ct=" + Str(q->contentTypeM) + (withBody ? " " + BodyBytes(q->bodyM) : "");
-  } else if (auto* r = dynamic_cast<ResponseWrapper*>(w.Get())) {
-    text += " ct=" + Str(r->contentTypeM) + (withBody ? " " + BodyBytes(r->bodyM) : "");
-  }
-  return text;
-}
-
-bool Equal(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-  if (!b) return false;
-  auto* q = dynamic_cast<RequestWrapper*>(a.Get());
-  auto* r = dynamic_cast<ResponseWrapper*>(a.Get());
-  if (q && dynamic_cast<RequestWrapper*>(b.Get())) return *q == *dynamic_cast<RequestWrapper*>(b.Get());
-  if (r && dynamic_cast<ResponseWrapper*>(b.Get())) return *r == *dynamic_cast<ResponseWrapper*>(b.Get());
-  return a->rpcIdM == b->rpcIdM && a->GetTypeName() == b->GetTypeName();
-}
-
 // Written again and read back by the reader that read it, a wrapper must come back equal.
 // Bodies the payload holds as binary are not written back as they came, and a message read
 // without a Content-Type is written with one (requests) or with an empty one (responses).
 void RequireRoundTrip(const ref<KernoRpcWrapper>& w, int setting) {
-  VekString frame, error;
-  auto* q = dynamic_cast<RequestWrapper*>(w.Get());
-  auto* r = dynamic_cast<ResponseWrapper*>(w.Get());
-  ref<LazyDict> body = q ? q->bodyM : r ? r->bodyM : nullptr;
-  if ((body && body->repM == LazyDict::REP_PROTOBUF) || ((q || r) && (q ? q->contentTypeM : r->contentTypeM).FEmpty())) return;
+  VekString frame, error, contentType = "-";
+  ref<LazyDict> body = rpcfuzz::Body(w, &contentType);
+  if ((body && body->repM == LazyDict::REP_PROTOBUF) || contentType.FEmpty()) return;
   if (!KernoRpcV2::MarshalToString(w, frame, error, Pool(), false)) return;  // a body that writes nothing
-  if (setting < 0) return Require(Equal(w, KernoRpcV2::UnmarshalFromString(Pool(), frame, false, error)));
+  if (setting < 0) return Require(rpcfuzz::SameWrapper(w, KernoRpcV2::UnmarshalFromString(Pool(), frame, false, error)));
   sarntest::TestSource source({Str(frame)});
   auto laziness = static_cast<KernoRpcV2BytestreamImpl::LazinessSettings>(setting);
-  Require(Equal(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), source, laziness, error)));
+  Require(rpcfuzz::SameWrapper(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), source, laziness, error)));
 }
 
 }  // namespace
@@ -108,10 +77,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), whole, setting, wholeError);
   ref<KernoRpcWrapper> again = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), pieces, setting, chunkError);
   Require(Str(wholeError) == Str(chunkError) && !read == !again);
-  if (read) Require(Summary(read, true) == Summary(again, true));
+  if (read) Require(rpcfuzz::Describe(Pool(), read) == rpcfuzz::Describe(Pool(), again));
   ref<KernoRpcWrapper> text = KernoRpcV2::UnmarshalFromString(Pool(), VekString::FromUtf8Bytes(Pool(), frame.size(), frame.data()), false, stringError);
   if (read && (data[0] & 0x80) != 0) {
-    Require(text && Summary(read, setting != 2) == Summary(text, setting != 2));
+    Require(text && rpcfuzz::Describe(Pool(), read, setting != 2) == rpcfuzz::Describe(Pool(), text, setting != 2));
   }
   if (text) RequireRoundTrip(text, -1);
   if (read) RequireRoundTrip(read, setting);

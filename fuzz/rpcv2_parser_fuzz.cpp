@@ -4,7 +4,7 @@
 // the frame.
 #include <cstdint>
 
-#include "RpcV2Recorder.h"
+#include "RpcFuzzSupport.h"
 
 namespace {
 

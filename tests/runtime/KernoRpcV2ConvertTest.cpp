@@ -11,9 +11,7 @@ namespace {
 
 // The wrapper's ToString, then " v" and its schema version, then "/" and its body's.
 std::string Summary(VekMempool* pool, const ref<KernoRpcWrapper>& w) {
-  auto* request = dynamic_cast<RequestWrapper*>(w.Get());
-  auto* response = dynamic_cast<ResponseWrapper*>(w.Get());
-  const ref<LazyDict> body = request ? request->bodyM : response ? response->bodyM : nullptr;
+  const ref<LazyDict> body = rpcfuzz::Body(w);
   if (!w) return "null";
   return Str(w->ToString(pool)) + " v" + std::to_string(w->schemaVersionM) + (body ? "/" + std::to_string(body->versionM) : "");
 }

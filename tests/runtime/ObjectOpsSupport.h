@@ -3,11 +3,11 @@
 // equality, the bytes left in a byte source, and bytes built from the inside out.
 #pragma once
 
-#include <memory>
 #include <sstream>
 #include <string>
 
 #include "sarn/Sarn.h"
+#include "../fuzz/RpcFuzzSupport.h"
 #include "testutil/TestStreams.h"
 #include "testutil/TestUtil.h"
 
@@ -78,22 +78,8 @@ inline ref<SarnObject> Nest(VekMempool* pool, int depth, const std::string& mess
   return inner;
 }
 
-// The wrappers' own operator== for two of one kind.
-inline bool SameWrapper(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-  auto *ra = dynamic_cast<RequestWrapper*>(a.Get()), *rb = dynamic_cast<RequestWrapper*>(b.Get());
-  auto *sa = dynamic_cast<ResponseWrapper*>(a.Get()), *sb = dynamic_cast<ResponseWrapper*>(b.Get());
-  auto *ca = dynamic_cast<CancelWrapper*>(a.Get()), *cb = dynamic_cast<CancelWrapper*>(b.Get());
-  return (ra && rb && *ra == *rb) || (sa && sb && *sa == *sb) || (ca && cb && *ca == *cb);
-}
-
-// What a duplicate of `source` reads, so that the source itself is not moved.
-inline std::string SourceBytes(wynbaselib::Bytesource* source) {
-  std::unique_ptr<wynbaselib::Bytesource> copy(source->Duplicate());
-  std::string all;
-  char block[4096];
-  for (size_t n; (n = copy->Read(block, sizeof block)) != 0;) all.append(block, n);
-  return all;
-}
+using rpcfuzz::SameWrapper;
+using rpcfuzz::SourceBytes;
 
 // Nested length-prefixed bytes built from the innermost out in linear time: each Prepend puts its
 // bytes in front of everything so far.

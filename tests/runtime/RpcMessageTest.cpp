@@ -1,7 +1,6 @@
 // Messages: the wrappers, the four writers, the string reader, the packetizer and the byte-source
 // reader, driven by the tables under tests/data/rpc/. A wrapper is built from a one-line recipe and
 // shown as one line (Describe), so that every reader and setting is held to the same text.
-#include <memory>
 #include <sstream>
 
 #include "runtime/ObjectOpsSupport.h"
@@ -12,6 +11,8 @@ namespace {
 using namespace sarn;
 using sarntest::Str;
 using Impl = KernoRpcV2BytestreamImpl;
+using rpcfuzz::Body;
+using rpcfuzz::BodyText;
 
 const Impl::LazinessSettings kSettings[] = {Impl::LazyUnparsed, Impl::LazyValidated, Impl::ParsedToDictionary};
 
@@ -51,25 +52,7 @@ struct RpcMessageTest : sarntest::PoolTest {
     return ResponseWrapper::New(&poolM, rpc, isFinal, payload, nullptr);
   }
 
-  static ref<LazyDict> Body(const ref<KernoRpcWrapper>& w, VekString* type = nullptr) {
-    if (auto* r = dynamic_cast<RequestWrapper*>(w.Get())) return type && (*type = r->contentTypeM, true), r->bodyM;
-    if (auto* r = dynamic_cast<ResponseWrapper*>(w.Get())) return type && (*type = r->contentTypeM, true), r->bodyM;
-    return nullptr;
-  }
-
-  // A body kept compressed is read from a copy of its source, so the payload is not changed.
-  static std::string BodyText(const ref<LazyDict>& body) {
-    if (!body) return "null";
-    return body->repM == LazyDict::REP_BYTESOURCE ? objopstest::SourceBytes(body->pBytesourceM) : Str(body->ToJson(false));
-  }
-
-  std::string Describe(const ref<KernoRpcWrapper>& w) {
-    if (!w) return "null";
-    VekString contentType = "-";
-    ref<LazyDict> body = Body(w, &contentType);
-    return Str(w->HeadersToDict(&poolM)->ToString(false)) + " v" + std::to_string(w->schemaVersionM) + " " +
-           Str(w->GetTypeName()) + (contentType == "-" ? "" : " ct=" + Str(contentType) + " body=" + BodyText(body));
-  }
+  std::string Describe(const ref<KernoRpcWrapper>& w) { return rpcfuzz::Describe(&poolM, w); }
 
   // The four writers on one message: "ok" when all wrote the same frame, else what each appended
   // to "prior", having left the buffer, the string and the sink untouched.

@@ -1,14 +1,14 @@
 // The frame parser: every case is fed whole, byte by byte and split at every position, and must
 // give the same event log each time (body pieces joined) and the same verdict. Logs are written
 // as their events joined by " | "; most cases are the tables under tests/data/rpc/.
-#include "../fuzz/RpcV2Recorder.h"
+#include "../fuzz/RpcFuzzSupport.h"
 #include "testutil/TestUtil.h"
 
 namespace {
 
 using sarn::RpcV2Parser;
 
-// What the parser reported (fuzz/RpcV2Recorder.h): one line per event, body pieces joined into
+// What the parser reported (fuzz/RpcFuzzSupport.h): one line per event, body pieces joined into
 // one line; their number is kept apart, as that is the one thing chunking changes.
 using rpcfuzz::Recorder;
 
