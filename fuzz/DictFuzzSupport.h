@@ -26,6 +26,23 @@ inline bool HasPassThrough(const VekString& text) {
   return false;
 }
 
+// Whether the bytes hold a control byte that the JSON writers escape as backslash-u (any but
+// \b \t \n \f \r and those in `except`): the readers keep such an escape as six characters.
+inline bool HasUnicodeEscapedControl(const void* data, size_t size, const char* except = "") {
+  const auto* bytes = static_cast<const unsigned char*>(data);
+  for (size_t i = 0; i < size; ++i) {
+    const char c = static_cast<char>(bytes[i]);
+    if (bytes[i] < 0x20 && (c == 0 || (!std::strchr("\b\t\n\f\r", c) && !std::strchr(except, c)))) return true;
+  }
+  return false;
+}
+
+// Whether an object's JSON holds a value the text forms cannot name (an enum number without a
+// name, or an id of a type the registry lacks), which is written but refused on reading.
+inline bool HoldsUnnamedValue(const std::string& json) {
+  return json.find("\"INVALID_VALUE:") != std::string::npos || json.find("\"XXX\"") != std::string::npos;
+}
+
 // Whether `test` holds for one of the names of `dictionary`.
 template <class Test>
 bool AnyName(const sarn::Dictionary& dictionary, const Test& test) {
