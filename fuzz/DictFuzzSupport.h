@@ -43,6 +43,24 @@ inline bool HoldsUnnamedValue(const std::string& json) {
   return json.find("\"INVALID_VALUE:") != std::string::npos || json.find("\"XXX\"") != std::string::npos;
 }
 
+// Reads `text` as an object at `version` from memory (piece 0) or from a byte source handing out
+// `piece` bytes per read: the object written at version 0, or "!" and the message. A refusal
+// clears a stale result in `object`; the byte source is left unmoved, both its duplicates deleted.
+inline std::string ReadObject(VekMempool* pool, sarn::JsonSarnObject& reader, const std::string& text, size_t piece,
+                              ref<sarn::SarnObject>& object, sarn::KernoVersion version = 0, size_t* pBytesRead = nullptr) {
+  VekString error;
+  sarntest::PieceSource::Counters counters;
+  sarntest::PieceSource source(text, piece, &counters);
+  size_t bytesRead = 0;
+  bool isOk = piece == 0 ? reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
+                                                   static_cast<int>(text.size()), version, &object, error)
+                         : reader.JsonToSarnObject(&source, bytesRead, version, &object, error);
+  Require(isOk == (object != nullptr) && source.GetPosition() == 0 && bytesRead <= text.size() &&
+          counters.nDuplicatedM == (piece == 0 ? 0 : 2) && counters.nDeletedM == counters.nDuplicatedM);
+  if (pBytesRead != nullptr) *pBytesRead = bytesRead;
+  return isOk ? sarntest::Str(sarn::JsonSarnObject(pool).SarnObjectToJson(object.Get(), 0)) : "!" + sarntest::Str(error);
+}
+
 // Whether `test` holds for one of the names of `dictionary`.
 template <class Test>
 bool AnyName(const sarn::Dictionary& dictionary, const Test& test) {

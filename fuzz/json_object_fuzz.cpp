@@ -17,33 +17,14 @@
 // list element, {} refused), a SUBDICT whose object names another type, lazy members (captured
 // text, not read), a repeated member (the later value here, the first there) and a repeated
 // "type" (the later one names the type here).
-#include <memory>
 
 #include "DictFuzzSupport.h"
 
 namespace {
 
 using namespace sarn;
-using sarntest::PieceSource;
 using sarntest::Require;
 using sarntest::Str;
-
-// Reads `text` from memory (piece 0) or from a byte source in pieces; "+" and the object written
-// at version 0, or "!" and the message. The byte source must be left unmoved, its two duplicates
-// deleted.
-std::string Read(VekMempool* pool, JsonSarnObject& reader, const std::string& text, size_t piece,
-                 ref<SarnObject>& object) {
-  VekString error;
-  PieceSource::Counters counters;
-  PieceSource source(text, piece, &counters);
-  size_t bytesRead = 0;
-  bool isOk = piece == 0 ? reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                                   static_cast<int>(text.size()), 0, &object, error)
-                         : reader.JsonToSarnObject(&source, bytesRead, 0, &object, error);
-  Require(isOk == (object != nullptr) && source.GetPosition() == 0 && bytesRead <= text.size() &&
-          counters.nDuplicatedM == (piece == 0 ? 0 : 2) && counters.nDeletedM == counters.nDuplicatedM);
-  return isOk ? "+" + Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), 0)) : "!" + Str(error);
-}
 
 // True when an object of the tree holds a free-form value, a lazy member or a subdict.
 bool HoldsPathDifference(const SarnObject* object) {
@@ -82,12 +63,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   [&] {
     JsonSarnObject reader(&pool);
     ref<SarnObject> object, viaSource, again;
-    const std::string memory = Read(&pool, reader, text, 0, object);
-    Require(Read(&pool, reader, text, piece, viaSource) == memory);
+    const std::string memory = dictfuzz::ReadObject(&pool, reader, text, 0, object);
+    Require(dictfuzz::ReadObject(&pool, reader, text, piece, viaSource) == memory);
     if (!object) return;
-    const std::string written = memory.substr(1);
-    const std::string second = Read(&pool, reader, written, 0, again);
-    Require(again ? second == memory : RefusedWhenWritten(written));
+    const std::string second = dictfuzz::ReadObject(&pool, reader, memory, 0, again);
+    Require(again ? second == memory : RefusedWhenWritten(memory));
 
     VekString treeError;
     ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(text.data()), text.size(),
@@ -97,7 +77,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     ref<SarnObject> viaTree;
     if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return;
     if (HoldsPathDifference(object.Get()) || RepeatsName(*tree)) return;
-    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == written);
+    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == memory);
   }();
   Require(pool.GetUsedBytes() == 0);  // everything a read made is released with its result
   return 0;

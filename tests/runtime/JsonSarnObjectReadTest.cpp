@@ -7,6 +7,7 @@
 
 #include <string>
 
+#include "../fuzz/DictFuzzSupport.h"
 #include "runtime/ObjectOpsSupport.h"
 
 namespace {
@@ -17,28 +18,19 @@ using sarntest::Str;
 
 class JsonReadTest : public sarntest::PoolTest {
  protected:
-  // "!" and the message for a refusal (the result must then be null), else the written object.
-  std::string Outcome(bool isOk, const ref<SarnObject>& object, const VekString& error) {
-    return isOk ? Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0)) : (object ? "result kept: " : "!") + Str(error);
+  // The written object, or "!" and the message (fuzz/DictFuzzSupport.h), from memory, where a
+  // stale result must be cleared.
+  std::string Memory(const std::string& text, KernoVersion version = 0) {
+    ref<SarnObject> object = sarnschema::Success::Factory(&poolM);
+    return dictfuzz::ReadObject(&poolM, readerM, text, 0, object, version);
   }
-  std::string Memory(const std::string& text, KernoVersion version = 0, int length = -2) {
-    ref<SarnObject> object = sarnschema::Success::Factory(&poolM);  // a stale result must be cleared
-    VekString error;
-    bool isOk = readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                         length == -2 ? static_cast<int>(text.size()) : length, version, &object, error);
-    return Outcome(isOk, object, error);
-  }
-  // Also checks that both duplicates are deleted, the source is not moved, and bytesRead.
+  // From a byte source in pieces; a text ending in '}' must be read to its end.
   std::string Source(const std::string& text, size_t piece) {
-    PieceSource::Counters counters;
-    PieceSource source(text, piece, &counters);
     ref<SarnObject> object;
-    VekString error;
     size_t bytesRead = 0;
-    bool isOk = readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error);
-    EXPECT_EQ(std::to_string(counters.nDuplicatedM) + std::to_string(counters.nDeletedM) + std::to_string(source.GetPosition()), "220");
-    EXPECT_TRUE(!isOk || text.back() != '}' || bytesRead == text.size()) << bytesRead;
-    return Outcome(isOk, object, error);
+    std::string got = dictfuzz::ReadObject(&poolM, readerM, text, piece, object, 0, &bytesRead);
+    EXPECT_TRUE(got[0] == '!' || text.back() != '}' || bytesRead == text.size()) << bytesRead;
+    return got;
   }
   // The members of `text` that `names` names, as "name=compact json" (null for none).
   std::string Pick(const std::string& text, const std::string& names) {
@@ -69,9 +61,11 @@ TEST_F(JsonReadTest, TableOfTextsAgreesThroughEveryEntryPoint) {
   // The version restricts nothing (isVisible is carried from version 9 on); entry-point refusals.
   EXPECT_EQ(Memory("{\"type\": \"syncDeltaInternal\", \"isVisible\": true}", 7),
             "{\"type\": \"syncDeltaInternal\", \"isVisible\": true}");
-  EXPECT_EQ(Memory("{}", 0, -1), "!Negative JSON length.");
+  ref<SarnObject> object;
+  VekString negative, error;
+  EXPECT_FALSE(readerM.JsonToSarnObject(reinterpret_cast<const unsigned char*>("{}"), -1, 0, &object, negative));
+  EXPECT_EQ(Str(negative), "Negative JSON length.");
   sarntest::TestSource undup({"{}"});
-  VekString error;
   size_t bytesRead = 0;
   EXPECT_FALSE(readerM.JsonToSarnObject(&undup, bytesRead, 0, nullptr, error));
   EXPECT_EQ(Str(error) + std::to_string(undup.nReadM), "Byte source cannot be duplicated.0");
