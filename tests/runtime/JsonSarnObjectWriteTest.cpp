@@ -169,13 +169,6 @@ TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
   for (int i = 1; i < kDepth; ++i) json += "{\"code\": \"badArgument\", \"text\": \"\", \"cause\": ";
   json += "{\"code\": \"badArgument\", \"text\": \"\", \"type\": \"error\"}";
   for (int i = 1; i < kDepth; ++i) json += ", \"type\": \"error\"}";
-  // Binary: code (08 03), text (1A 00), then cause (2A) holding the known dict of type 346 (D2 15).
-  objopstest::InsideOut binary(std::string("\xD2\x15\x04\x08\x03\x1A\x00", 7));
-  for (int i = 1; i < kDepth; ++i) {
-    binary.Prepend("\x2A" + sarntest::Varint(binary.reversedM.size()));
-    binary.Prepend(std::string("\x08\x03\x1A\x00", 4));
-    binary.Prepend("\xD2\x15" + sarntest::Varint(binary.reversedM.size()));
-  }
   const std::pair<std::function<bool(VekMempool*, std::string&)>, std::string> writers[] = {
       {[&](VekMempool* pool, std::string& text) {
          ByteBuffer out(&poolM);
@@ -190,7 +183,7 @@ TEST_F(JsonWriteTest, ObjectChainsOfAnyDepthAreWrittenByEveryWriter) {
          bytes = sarntest::Finished(out);
          return !out.IsOutOfMemory();
        },
-       binary.Bytes()},
+       objopstest::ErrorChainBytes(kDepth, 3)},
   };
   for (const auto& [write, expected] : writers) {
     std::string out;

@@ -252,8 +252,8 @@ TEST_F(LazyDictTest, EveryOperationOfEveryForm) {
 }
 
 // Random envelopes (their bodies success, cancel or envelopes again), every payload replaced, the
-// innermost first, by the next form holding its object: marshalled and read back they are equal,
-// write the same bytes again, and each payload is unparsed bytes converting to its object.
+// innermost first, by the next form holding its object: marshalled and read back they are equal
+// (payloads compared by their trees), write the same bytes again, and the payload read is unparsed.
 TEST_F(LazyDictTest, RandomEnvelopesWithPayloadsInEveryFormTravelUnparsed) {
   sarntest::RandomObjects random(&poolM, 615, {543, 974, 975, 976, 2238}, 3, false);
   random.isWithControlsM = false;
@@ -270,19 +270,13 @@ TEST_F(LazyDictTest, RandomEnvelopesWithPayloadsInEveryFormTravelUnparsed) {
     static const char* const kForms[] = {"dict0", "json0", "pb0", "object0", "dictionary0", "source0"};
     FieldAccess::PutReference(o, o->GetStructInfo()->vFieldInfo[2], MakePayload(&poolM, kForms[nextForm++ % 6], &counts, inner).Get());
   };
-  std::function<void(SarnObject*, SarnObject*)> expectUnparsed = [&](SarnObject* made, SarnObject* read) {
-    if (!lazy(made)) return;
-    ref<SarnObject> object = lazy(read)->ToSarnObjectOrError(), source = lazy(made)->ToSarnObjectOrError();
-    ASSERT_TRUE(lazy(read)->repM == LazyDict::REP_PROTOBUF && *object == *source) << Str(source->ToString(false, 0));
-    expectUnparsed(source.Get(), object.Get());
-  };
   for (int i = 0; i < 300 && !HasFatalFailure(); ++i) {
     ref<SarnObject> object = random.Make(i % 3 == 2 ? 2238 : 975 + i % 3);
     reform(object.Get());
     std::string bytes = KnownDictBytes(&poolM, object.Get());
     ref<SarnObject> back = ReadKnownDict(&poolM, bytes);
     ASSERT_TRUE(back && *back == *object && *object == *back && KnownDictBytes(&poolM, back.Get()) == bytes) << i;
-    expectUnparsed(object.Get(), back.Get());
+    ASSERT_EQ(lazy(back.Get()) ? lazy(back.Get())->repM : LazyDict::REP_PROTOBUF, LazyDict::REP_PROTOBUF) << i;
   }
   EXPECT_GT(nextForm, 600);
 }

@@ -90,4 +90,15 @@ struct InsideOut {
   std::string reversedM;
 };
 
+// The known-dict bytes of `depth` errors of code `code`, each the cause of the next: code (08),
+// text (1A 00), cause (2A) holding the known dict of type 346 (D2 15).
+inline std::string ErrorChainBytes(int depth, char code) {
+  InsideOut bytes(std::string("\xD2\x15\x04\x08", 4) + code + std::string("\x1A\x00", 2));
+  for (int i = 1; i < depth; ++i) {
+    bytes.Prepend(std::string("\x08", 1) + code + std::string("\x1A\x00\x2A", 3) + sarntest::Varint(bytes.reversedM.size()));
+    bytes.Prepend("\xD2\x15" + sarntest::Varint(bytes.reversedM.size()));
+  }
+  return bytes.Bytes();
+}
+
 }  // namespace objopstest

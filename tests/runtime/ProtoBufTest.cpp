@@ -9,9 +9,8 @@
 #include <functional>
 #include <string>
 
-#include "sarn/Sarn.h"
+#include "runtime/ObjectOpsSupport.h"
 #include "testutil/ObjectFill.h"
-#include "testutil/TestUtil.h"
 
 using namespace sarn;
 
@@ -178,28 +177,17 @@ TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
 // A chain of errors, each the cause of the next: at the nesting limit it reads (in a 256 KiB
 // thread stack), one deeper it fails, and a smaller limit given to the value applies.
 TEST_F(ProtoBufTest, NestingIsBoundedByTheLimits) {
-  auto chain = [&](int depth) {
-    ref<SarnObject> top = Make(sarnschema::Error::TYPE_ID);
-    SarnObject* last = top.Get();
-    for (int i = 1; i < depth; ++i) {
-      ref<SarnObject> cause = Make(sarnschema::Error::TYPE_ID);
-      static_cast<sarnschema::Error*>(last)->causeM = cause;
-      MarkFieldPresent(last, Field(sarnschema::Error::TYPE_ID, 5));
-      last = cause.Get();
-    }
-    return Known(top.Get());
-  };
   auto reads = [](const ProtoBuf& codec, const std::string& bytes) {
     ref<SarnObject> object;
     return codec.UnmarshalKnownDict(U(bytes), static_cast<int>(bytes.size()), &object);
   };
   for (int depth : {Limits::kDefaultMaxDepth, Limits::kDefaultMaxDepth + 1}) {
-    std::string bytes = chain(depth);
+    std::string bytes = objopstest::ErrorChainBytes(depth, 0);
     bool isOk = false;
     sarntest::RunOnStack(256 * 1024, [&] { isOk = reads(Codec(), bytes); });
     EXPECT_EQ(isOk, depth == Limits::kDefaultMaxDepth) << depth;
   }
-  EXPECT_FALSE(reads(ProtoBuf(&poolM, Schema::vStructDefG, Schema::nStructDefG, Limits(3)), chain(4)));
+  EXPECT_FALSE(reads(ProtoBuf(&poolM, Schema::vStructDefG, Schema::nStructDefG, Limits(3)), objopstest::ErrorChainBytes(4, 0)));
 }
 
 using sarntest::Finished;

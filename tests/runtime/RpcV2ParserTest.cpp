@@ -42,13 +42,6 @@ std::string Frame(const std::string& block, const std::string& body) {
   return "MRPC/2 " + std::to_string(block.size()) + " " + std::to_string(body.size()) + "\r\n" + block + body;
 }
 
-// A header block: each line with CR LF, then the empty line.
-std::string Block(std::initializer_list<std::string> lines) {
-  std::string block;
-  for (const std::string& line : lines) block += line + "\r\n";
-  return block + "\r\n";
-}
-
 const std::string kBody = "{\"type\": \"kernoCurrentTimeGet\"}";
 const std::string kExample =
     "MRPC/2 135 31\r\nContent-Type: application/json\r\nRequestType: kernoCurrentTimeGet\r\n"
@@ -94,7 +87,7 @@ TEST(RpcV2ParserTest, FramesFromTables) {
   // One line after two good ones: what it adds to the log, or its error.
   for (const auto& row : sarntest::ReadTable("rpc/header-lines.txt", 2)) {
     SCOPED_TRACE(row[0]);
-    const std::string block = Block({"RpcId: 1", "Type: response", row[0]});
+    const std::string block = "RpcId: 1\r\nType: response\r\n" + row[0] + "\r\n\r\n";
     const bool isError = row[1].rfind("error", 0) == 0;
     ExpectLog(Frame(block, "{}"), "headerSize " + std::to_string(block.size()) +
                                       " | bodySize 2 | header [RpcId] [1] | header [Type] [response] | " + row[1] +
