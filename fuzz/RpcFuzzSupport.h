@@ -117,4 +117,20 @@ struct Recorder : sarn::RpcV2Parser::Callbacks {
   const char* lastBodyChunkM = nullptr;
 };
 
+// Feeds the chunks as a reader does (stopping at the first refusal), then ends the input; the log
+// closes with the verdicts of ParseChunk and EndParse. Destroying the parser ends the input once
+// more, so a frame cut short repeats its error.
+inline Recorder Feed(const std::vector<std::string_view>& chunks) {
+  Recorder log;
+  {
+    sarn::RpcV2Parser parser(log);
+    bool isOk = true;
+    for (size_t i = 0; isOk && i < chunks.size(); ++i) isOk = parser.ParseChunk(chunks[i].data(), chunks[i].size());
+    log.Note(isOk ? "parse true" : "parse false");
+    log.Note(parser.EndParse() ? "end true" : "end false");
+    log.errorsM = 0;  // for the destructor's repeat
+  }
+  return log;
+}
+
 }  // namespace rpcfuzz

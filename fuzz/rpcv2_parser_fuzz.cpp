@@ -8,27 +8,16 @@
 
 namespace {
 
-using sarn::RpcV2Parser;
-
-// Feeds the frame as a reader does, stopping at the first refusal; `sizes` empty means whole.
+// The frame in chunks of the given sizes used in turn (some may be empty); `sizes` empty: whole.
 std::string Run(const char* frame, size_t length, const uint8_t* sizes, size_t nSizes, size_t scale) {
-  rpcfuzz::Recorder recorder;
-  {
-    RpcV2Parser parser(recorder);
-    bool isOk = true;
-    size_t at = 0;
-    size_t turn = 0;
-    do {
-      size_t chunk = nSizes == 0 ? length - at : sizes[turn++ % nSizes] * scale;
-      if (chunk > length - at) chunk = length - at;
-      isOk = parser.ParseChunk(frame + at, chunk);
-      at += chunk;
-    } while (isOk && at < length);
-    recorder.Note(isOk ? "parse true" : "parse false");
-    recorder.Note(parser.EndParse() ? "end true" : "end false");
-    recorder.errorsM = 0;  // the destructor may repeat an end error
-  }
-  return recorder.Text();
+  std::vector<std::string_view> chunks;
+  size_t at = 0, turn = 0;
+  do {
+    const size_t chunk = std::min(nSizes == 0 ? length - at : sizes[turn++ % nSizes] * scale, length - at);
+    chunks.emplace_back(frame + at, chunk);
+    at += chunk;
+  } while (at < length);
+  return rpcfuzz::Feed(chunks).Text();
 }
 
 }  // namespace

@@ -19,9 +19,7 @@ using LazyDictTest = sarntest::PoolTest;
 // Byte sources deliver one byte per read and count duplicates, deletions and reads of the original.
 using SourceCounts = sarntest::PieceSource::Counters;
 
-std::string ObjectJson(VekMempool* pool, const ref<SarnObject>& object, KernoVersion version = 0) {
-  return object ? Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), version)) : "null";
-}
+using objopstest::ObjectJson;
 
 using sarntest::KnownDictBytes;
 using sarntest::ReadKnownDict;

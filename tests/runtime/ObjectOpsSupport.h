@@ -25,6 +25,11 @@ inline ref<SarnObject> FromJson(VekMempool* pool, const std::string& json) {
   return object;
 }
 
+// The object's JSON text at `version`, or "null".
+inline std::string ObjectJson(VekMempool* pool, const ref<SarnObject>& object, KernoVersion version = 0) {
+  return object ? Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), version)) : "null";
+}
+
 inline ref<SarnObject> BinaryCopy(VekMempool* pool, const SarnObject* object) {
   return sarntest::ReadKnownDict(pool, sarntest::KnownDictBytes(pool, object));
 }

@@ -36,9 +36,7 @@ class ProtoBufTest : public sarntest::PoolTest {
     ref<SarnObject> object;
     return Codec().Unmarshal(U(bytes), static_cast<int>(bytes.size()), typeId, &object) ? object : nullptr;
   }
-  std::string Json(const ref<SarnObject>& object) {
-    return sarntest::Str(JsonSarnObject(&poolM).SarnObjectToJson(object.Get(), 0));
-  }
+  std::string Json(const ref<SarnObject>& object) { return objopstest::ObjectJson(&poolM, object); }
   std::string ErrorText(const ref<SarnObject>& object) {
     if (!object || object->GetTypeId() != sarnschema::Error::TYPE_ID) return "<not an error>";
     auto* error = static_cast<sarnschema::Error*>(object.Get());

@@ -8,27 +8,12 @@ namespace {
 
 using sarn::RpcV2Parser;
 
-// What the parser reported (fuzz/RpcFuzzSupport.h): one line per event, body pieces joined into
-// one line; their number is kept apart, as that is the one thing chunking changes.
+// What the parser reported, fed as a reader feeds it (fuzz/RpcFuzzSupport.h): one line per event,
+// body pieces joined into one line; their number is kept apart, as that is the one thing chunking
+// changes.
 using rpcfuzz::Recorder;
 
-// Feeds the chunks as a reader does (stopping at the first refusal), then ends the input; the
-// log closes with the verdicts of ParseChunk and EndParse.
-// Destroying the parser ends the input once more, so a frame cut short repeats its error.
-Recorder Feed(const std::vector<std::string_view>& chunks) {
-  Recorder log;
-  {
-    RpcV2Parser parser(log);
-    bool isOk = true;
-    for (std::string_view chunk : chunks) {
-      if (!(isOk = parser.ParseChunk(chunk.data(), chunk.size()))) break;
-    }
-    log.Note(std::string("parse ") + (isOk ? "true" : "false"));
-    log.Note(std::string("end ") + (parser.EndParse() ? "true" : "false"));
-    log.errorsM = 0;  // destroying the parser may repeat an end error
-  }
-  return log;
-}
+using rpcfuzz::Feed;
 
 // The log of `input` under every feeding must be `expected`.
 void ExpectLog(std::string_view input, const std::string& expected) {
