@@ -45,10 +45,7 @@ template <class T, class Read, class Write>
 void CheckReader(const uint8_t* data, size_t n, Read read, Write write) {
   const unsigned char* cursor = data;
   T value = T(7);
-  if (!read(&cursor, data + n, &value)) {
-    Require(cursor == data && value == T(7));
-    return;
-  }
+  if (!read(&cursor, data + n, &value)) return Require(cursor == data && value == T(7));
   Require(cursor > data && cursor <= data + n);
   sarn::ProtoBufByteOutputStream out;
   write(value, &out);

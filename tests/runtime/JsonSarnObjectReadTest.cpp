@@ -13,7 +13,6 @@
 namespace {
 
 using namespace sarn;
-using sarntest::PieceSource;
 using sarntest::Str;
 
 class JsonReadTest : public sarntest::PoolTest {
@@ -100,11 +99,8 @@ TEST_F(JsonReadTest, LazyMembersKeepTheirExactBytesAcrossBlockBoundaries) {
     // The trailing comma keeps the streaming parser from reading the member: written unchanged.
     EXPECT_NE(Memory(text).find("\"request\": " + member + ", "), std::string::npos) << shift;
     for (size_t piece : {7, 16384}) {
-      PieceSource source(text, piece);
       ref<SarnObject> object;
-      VekString error;
-      size_t bytesRead;
-      ASSERT_TRUE(readerM.JsonToSarnObject(&source, bytesRead, 0, &object, error));
+      ASSERT_NE(dictfuzz::ReadObject(&poolM, readerM, text, piece, object)[0], '!');
       auto* request = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
       const LazyDict* lazy = request->requestM.Get();
       EXPECT_EQ(Captured(lazy) + Str(lazy->ToJson(false)) + Str(lazy->ToJson(true)) +

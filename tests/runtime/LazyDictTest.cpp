@@ -316,13 +316,6 @@ TEST_F(LazyDictTest, PayloadsInsideTreesWriteAndCompareAsPayloads) {
   EXPECT_EQ(Str(LazyDictValue::EmptyValue(&poolM)->ToJson(false)), "{}");
 }
 
-}  // namespace
-
-namespace {
-
-using namespace dicttest;
-using LazyNestingTest = sarntest::PoolTest;
-
 // Protocol-buffer bytes of a kernoRpcRequest whose request holds another one, `depth` times, around
 // an address: each level's bytes are the known dict (tag, length) of its fields, the lazy last.
 std::string NestedRequests(VekMempool* pool, int depth) {
@@ -340,7 +333,7 @@ size_t Count(const std::string& text, const std::string& what) {
   return n;
 }
 
-TEST_F(LazyNestingTest, PayloadsNestedPastTheLimitConvertOnASmallStack) {
+TEST_F(LazyDictTest, PayloadsNestedPastTheLimitConvertOnASmallStack) {
   const std::string limit = "Lazy payload nesting exceeds the depth limit of 512 levels.";
   sarntest::RunOnStack(256 * 1024, [&] {
     std::string bytes = NestedRequests(&poolM, 100000);
