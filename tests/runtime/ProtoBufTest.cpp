@@ -48,12 +48,8 @@ class ProtoBufTest : public sarntest::PoolTest {
 }  // namespace
 
 TEST_F(ProtoBufTest, WriterGivesExactBytes) {
-  ref<SarnObject> all = Make(kTestAllTypes);
-  int minusOne = -1;
-  double one = 1.0;
-  FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 43), &minusOne);
-  FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 22), &one);
-  for (uint32_t day : {1u, 2u}) FieldAccess::PutScalar(all.Get(), Field(kTestAllTypes, 20), &day);
+  // int (43) -1, float (22) 1.0, enumMulti (20) monday and tuesday (1 and 2).
+  ref<SarnObject> all = objopstest::FromJson(&poolM, R"({"type": "testAllTypes", "int": -1, "float": 1, "enumMulti": ["monday", "tuesday"]})");
   ref<Dict> dict = Dict::New(&poolM, VekString());
   dict->AddString("a", "b");
   const std::pair<std::function<void(const ProtoBuf&, ProtoBufByteOutputStream*)>, std::string> cases[] = {
@@ -115,11 +111,8 @@ TEST_F(ProtoBufTest, ReaderRefusesMalformedFieldsAndSkipsUnknownOnes) {
   EXPECT_TRUE(Read(full));
   EXPECT_FALSE(Read(full + "\x28\x01"));
   // A single field given twice keeps the later value; a MULTI field keeps both.
-  ref<SarnObject> twice = Read("\xD8\x02\x02\xD8\x02\x04\xE0\x02\x02\xE0\x02\x04");
-  ASSERT_TRUE(twice);
-  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), Field(kTestAllTypes, 43), 0), 2);
-  ASSERT_EQ(FieldAccess::Count(twice.Get(), Field(kTestAllTypes, 44)), 2u);
-  EXPECT_EQ(FieldAccess::ScalarValue<int32_t>(twice.Get(), Field(kTestAllTypes, 44), 1), 2);
+  const std::string twice = Json(Read("\xD8\x02\x02\xD8\x02\x04\xE0\x02\x02\xE0\x02\x04"));
+  EXPECT_NE(twice.find("\"int\": 2, \"intMulti\": [1,2], "), std::string::npos) << twice;
 }
 
 TEST_F(ProtoBufTest, AnyDictsReadBackAndMalformedOnesFail) {
