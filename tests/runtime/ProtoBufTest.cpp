@@ -148,21 +148,9 @@ TEST_F(ProtoBufTest, EnvelopeReaderNamesEachFailure) {
   for (const auto& row : sarntest::ReadTable("binary/envelopes.txt", 2)) {
     ref<SarnObject> object = Codec().UnmarshalWrapper(U(row[0]), static_cast<int>(row[0].size()));
     ASSERT_TRUE(object);
-    if (row[1] != "reads") {
-      EXPECT_EQ(ErrorText(object), row[1]) << testing::PrintToString(row[0]);
-      continue;
-    }
-    auto* wrapper = static_cast<sarnschema::KernoRpcRequest*>(object.Get());
-    EXPECT_EQ(wrapper->rpcIdM, 9);
-    EXPECT_EQ(Json(wrapper->requestM->ToSarnObjectOrError()), "{\"rpcId\": 5, \"type\": \"kernoRpcCancel\"}");
+    EXPECT_EQ(object->GetTypeId() == sarnschema::Error::TYPE_ID ? ErrorText(object) : Json(object), row[1])
+        << testing::PrintToString(row[0]);
   }
-  // Bodies that do not read become error objects inside readable envelopes.
-  ref<SarnObject> badRequest = Codec().UnmarshalWrapper(U("\xFA\x3C\x04\x12\x02\x08\x0A"), 7);
-  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcRequest*>(badRequest.Get())->requestM->ToSarnObjectOrError()),
-            "request did not unmarshal");
-  ref<SarnObject> badResponse = Codec().UnmarshalWrapper(U("\x82\x3D\x04\x12\x02\x08\x0A"), 7);
-  EXPECT_EQ(ErrorText(static_cast<sarnschema::KernoRpcResponse*>(badResponse.Get())->responseM->ToSarnObjectOrError()),
-            "response did not unmarshal");
 }
 
 // A chain of errors, each the cause of the next: at the nesting limit it reads (in a 256 KiB
