@@ -15,18 +15,15 @@ using sarntest::Str;
 
 // Everything a payload answers, as text; each form's type queries last, since they may switch it.
 std::string Answers(VekMempool* pool, LazyDict& payload) {
-  ProtoBuf binary(pool, Schema::vStructDefG, Schema::nStructDefG);
   LazyDict::Rep rep = payload.repM;
   VekString error;
   ref<Dictionary> tree = payload.ToDictionary(error);
   std::string out = (tree ? Str(tree->ToJson(false)) : Str(error)) + "|" + Str(payload.ToDict()->ToString(false));
   out += "|" + Str(payload.ToJson(true));
   ref<vek::ByteBuffer> bytes = payload.ToProtobuf();
-  ref<SarnObject> back;
   // Stored protocol-buffer bytes are handed back as they are, read or not.
-  Require(bytes && (rep == LazyDict::REP_PROTOBUF ||
-                    binary.UnmarshalKnownDict(bytes->GetData(), static_cast<int>(bytes->GetLength()), &back)));
-  out += "|" + std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
+  Require(bytes && (rep == LazyDict::REP_PROTOBUF || sarntest::ReadKnownDict(pool, Str(bytes))));
+  out += "|" + Str(bytes);
   for (bool isDirect : {false, true}) {
     VekFeatures::SetEnabled(548, isDirect);
     ref<SarnObject> object = payload.ToSarnObjectOrError();

@@ -3,10 +3,6 @@
 // messages, lazy capture across block boundaries, and depth and count limits at their edges.
 // Objects of every type written, read and written again are the object reader fuzz target's
 // random_object_* seeds.
-#include <gtest/gtest.h>
-
-#include <string>
-
 #include "../fuzz/DictFuzzSupport.h"
 #include "runtime/ObjectOpsSupport.h"
 

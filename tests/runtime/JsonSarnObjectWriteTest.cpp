@@ -1,13 +1,9 @@
 // The object-to-JSON writer: exact bytes for every data type, the place of "type", version
 // filtering at the edges of ranges, null references, and depth without limit (also for the
 // binary writer, which walks objects the same way).
-#include <gtest/gtest.h>
-
 #include <functional>
-#include <string>
 #include <vector>
 
-#include "sarn/Sarn.h"
 #include "runtime/ObjectOpsSupport.h"
 
 namespace {

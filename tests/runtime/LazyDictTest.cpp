@@ -7,9 +7,7 @@
 
 #include "runtime/DictTestSupport.h"
 #include "runtime/ObjectOpsSupport.h"
-#include "testutil/ObjectFill.h"
 #include "testutil/RandomObject.h"
-#include "testutil/TestStreams.h"
 
 namespace {
 

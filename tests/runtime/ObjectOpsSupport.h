@@ -8,7 +8,6 @@
 
 #include "sarn/Sarn.h"
 #include "../fuzz/RpcFuzzSupport.h"
-#include "testutil/TestStreams.h"
 #include "testutil/TestUtil.h"
 
 namespace objopstest {

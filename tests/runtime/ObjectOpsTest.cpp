@@ -1,8 +1,6 @@
 // The object operations: equality by its rules from a table and as a property of seeded random
 // objects and their copies (every change to a copy is seen, and undoing it makes them equal
 // again), depth compared without C stack, and the conversion members and Clone from a table.
-#include <gtest/gtest.h>
-
 #include <cstring>
 #include <utility>
 

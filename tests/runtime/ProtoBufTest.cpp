@@ -3,11 +3,8 @@
 // the nesting limit at N and N+1; then varints and the sectioned output stream, with exact bytes
 // of writers and of Finish and readers at their boundaries (Finish against a plain length-prefix
 // encoder on section trees is the oracle of the binary stream fuzz target, on its seeds).
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <functional>
-#include <string>
 
 #include "runtime/ObjectOpsSupport.h"
 #include "testutil/ObjectFill.h"
