@@ -13,10 +13,8 @@ using namespace sarn;
 using sarntest::Require;
 using sarntest::Str;
 
-VekMempool* Pool() {
-  static VekMempool* pool = new VekMempool("rpc_message_fuzz");
-  return pool;
-}
+// Messages may keep their pool's blocks between inputs; one pool lives as long as the process.
+VekMempool* const pPoolG = new VekMempool("rpc_message_fuzz");
 
 // Each own header once, names in byte order, no blanks around a key, and one optional header.
 std::string Assemble(const std::string& rest) {
@@ -52,11 +50,11 @@ void RequireRoundTrip(const ref<KernoRpcWrapper>& w, int setting) {
   VekString frame, error, contentType = "-";
   ref<LazyDict> body = rpcfuzz::Body(w, &contentType);
   if ((body && body->repM == LazyDict::REP_PROTOBUF) || contentType.FEmpty()) return;
-  if (!KernoRpcV2::MarshalToString(w, frame, error, Pool(), false)) return;  // a body that writes nothing
-  if (setting < 0) return Require(rpcfuzz::SameWrapper(w, KernoRpcV2::UnmarshalFromString(Pool(), frame, false, error)));
+  if (!KernoRpcV2::MarshalToString(w, frame, error, pPoolG, false)) return;  // a body that writes nothing
+  if (setting < 0) return Require(rpcfuzz::SameWrapper(w, KernoRpcV2::UnmarshalFromString(pPoolG, frame, false, error)));
   sarntest::TestSource source({Str(frame)});
   auto laziness = static_cast<KernoRpcV2BytestreamImpl::LazinessSettings>(setting);
-  Require(rpcfuzz::SameWrapper(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), source, laziness, error)));
+  Require(rpcfuzz::SameWrapper(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, source, laziness, error)));
 }
 
 }  // namespace
@@ -74,13 +72,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   VekString wholeError, chunkError, stringError;
   sarntest::TestSource whole({frame}), pieces(chunks);
-  ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), whole, setting, wholeError);
-  ref<KernoRpcWrapper> again = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), pieces, setting, chunkError);
+  ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, whole, setting, wholeError);
+  ref<KernoRpcWrapper> again = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, pieces, setting, chunkError);
   Require(Str(wholeError) == Str(chunkError) && !read == !again);
-  if (read) Require(rpcfuzz::Describe(Pool(), read) == rpcfuzz::Describe(Pool(), again));
-  ref<KernoRpcWrapper> text = KernoRpcV2::UnmarshalFromString(Pool(), VekString::FromUtf8Bytes(Pool(), frame.size(), frame.data()), false, stringError);
+  if (read) Require(rpcfuzz::Describe(pPoolG, read) == rpcfuzz::Describe(pPoolG, again));
+  ref<KernoRpcWrapper> text = KernoRpcV2::UnmarshalFromString(pPoolG, VekString::FromUtf8Bytes(pPoolG, frame.size(), frame.data()), false, stringError);
   if (read && (data[0] & 0x80) != 0) {
-    Require(text && rpcfuzz::Describe(Pool(), read, setting != 2) == rpcfuzz::Describe(Pool(), text, setting != 2));
+    Require(text && rpcfuzz::Describe(pPoolG, read, setting != 2) == rpcfuzz::Describe(pPoolG, text, setting != 2));
   }
   if (text) RequireRoundTrip(text, -1);
   if (read) RequireRoundTrip(read, setting);
