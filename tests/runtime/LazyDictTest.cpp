@@ -31,22 +31,15 @@ std::string Hex(const std::string& bytes) {
 
 // The worked address with its optional second street, and with a street of `street1` bytes.
 ref<SarnObject> Address(VekMempool* pool, size_t street1 = 0) {
-  ref<SarnObject> address = sarntest::MakeWorkedAddress(pool);
-  auto* fields = static_cast<sarnschema::Address*>(address.Get());
-  fields->street2M = "Back";
-  fields->fHasStreet2M = true;
-  if (street1 != 0) fields->street1M = Text(pool, std::string(street1, 's'));
-  return address;
+  const std::string street = street1 == 0 ? "Main St 1" : std::string(street1, 's');
+  return objopstest::FromJson(pool, R"({"type": "address", "addressId": "vask:ds.7", "city": "Oslo", "country": "NO", )"
+                                    R"("levelOfDetail": "high", "postalCode": "0150", "street1": ")" + street + R"(", "street2": "Back"})");
 }
 
 // The payloads of the table by name: "<form><version>" for the address (or `object`) in each form, and others.
 ref<LazyDict> MakePayload(VekMempool* pool, const std::string& name, SourceCounts* counts, ref<SarnObject> object = nullptr) {
   ref<SarnObject> address = object ? object : Address(pool, name == "longSource" ? 20000 : name == "longObject" ? 40000 : 0);
-  if (name.rfind("logged", 0) == 0) {
-    address = sarnschema::ChannelMapConfigInstructions::Factory(pool);
-    static_cast<sarnschema::ChannelMapConfigInstructions*>(address.Get())->hostNameM = "host";
-    static_cast<sarnschema::ChannelMapConfigInstructions*>(address.Get())->fHasHostNameM = true;
-  }
+  if (name.rfind("logged", 0) == 0) address = objopstest::FromJson(pool, R"({"type": "channelMapConfigInstructions", "hostName": "host"})");
   KernoVersion version = name.back() == '2' ? 42 : 0;
   std::string form = name.substr(0, name.find_first_of("0123456789"));
   ref<Dictionary> tree = DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG)

@@ -25,13 +25,12 @@ class ProtoBufTest : public sarntest::PoolTest {
     write(Codec(), &out);
     return sarntest::Finished(out);
   }
-  std::string Known(const SarnObject* object) { return sarntest::KnownDictBytes(&poolM, object); }
   ref<SarnObject> Make(unsigned typeId) { return StructInfoForId(typeId)->pFactory(&poolM); }
   const FieldInfo& Field(unsigned typeId, unsigned number) { return StructInfoForId(typeId)->vFieldInfo[number]; }
-  // Reads `bytes` as the fields of a `typeId`; the object, or null when the read fails.
-  ref<SarnObject> Read(const std::string& bytes, unsigned typeId = kTestAllTypes) {
+  // Reads `bytes` as the fields of a testAllTypes; the object, or null when the read fails.
+  ref<SarnObject> Read(const std::string& bytes) {
     ref<SarnObject> object;
-    return Codec().Unmarshal(U(bytes), static_cast<int>(bytes.size()), typeId, &object) ? object : nullptr;
+    return Codec().Unmarshal(U(bytes), static_cast<int>(bytes.size()), kTestAllTypes, &object) ? object : nullptr;
   }
   std::string Json(const ref<SarnObject>& object) { return objopstest::ObjectJson(&poolM, object); }
   std::string ErrorText(const ref<SarnObject>& object) {
@@ -61,9 +60,8 @@ TEST_F(ProtoBufTest, WriterGivesExactBytes) {
   };
   for (const auto& [write, bytes] : cases) EXPECT_EQ(Write(write), bytes);
 
-  ref<SarnObject> cancel = Make(974);
-  static_cast<sarnschema::KernoRpcCancel*>(cancel.Get())->rpcIdM = 5;
-  std::string cancelBytes = Known(cancel.Get());
+  ref<SarnObject> cancel = objopstest::FromJson(&poolM, R"({"type": "kernoRpcCancel", "rpcId": 5})");
+  std::string cancelBytes = sarntest::KnownDictBytes(&poolM, cancel.Get());
   EXPECT_EQ(cancelBytes, "\xF2\x3C\x02\x08\x0A");
   EXPECT_EQ(Json(Codec().UnmarshalWrapper(U(cancelBytes), 5)), Json(cancel));
 
@@ -87,7 +85,7 @@ TEST_F(ProtoBufTest, EveryTypeRoundTrips) {
     }
     ref<SarnObject> object = info->pFactory(&poolM);
     sarntest::FillObject(&poolM, object.Get(), static_cast<unsigned>(id), 2);
-    ref<SarnObject> back = sarntest::ReadKnownDict(&poolM, Known(object.Get()));
+    ref<SarnObject> back = sarntest::ReadKnownDict(&poolM, sarntest::KnownDictBytes(&poolM, object.Get()));
     ASSERT_TRUE(back && Json(back) == Json(object)) << info->pName;
     ++checked;
   }
