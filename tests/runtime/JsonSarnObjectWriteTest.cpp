@@ -1,9 +1,6 @@
 // The object-to-JSON writer: exact bytes for every data type, the place of "type", version
 // filtering at the edges of ranges, null references, and depth without limit (also for the
 // binary writer, which walks objects the same way).
-#include <functional>
-#include <vector>
-
 #include "runtime/ObjectOpsSupport.h"
 
 namespace {

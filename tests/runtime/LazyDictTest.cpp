@@ -2,7 +2,6 @@
 // duplicates, feature 548 and the sink pieces, the log line, equality, and the payload inside an
 // object written as JSON, converted to a Dictionary and marshalled, and in version-1 envelopes),
 // random envelopes nesting payloads of every form through the binary form, and nesting past the limit.
-#include <functional>
 #include <regex>
 
 #include "runtime/DictTestSupport.h"

@@ -4,7 +4,6 @@
 // of writers and of Finish and readers at their boundaries (Finish against a plain length-prefix
 // encoder on section trees is the oracle of the binary stream fuzz target, on its seeds).
 #include <algorithm>
-#include <functional>
 
 #include "runtime/ObjectOpsSupport.h"
 #include "testutil/ObjectFill.h"
@@ -25,7 +24,6 @@ class ProtoBufTest : public sarntest::PoolTest {
     write(Codec(), &out);
     return sarntest::Finished(out);
   }
-  ref<SarnObject> Make(unsigned typeId) { return StructInfoForId(typeId)->pFactory(&poolM); }
   const FieldInfo& Field(unsigned typeId, unsigned number) { return StructInfoForId(typeId)->vFieldInfo[number]; }
   // Reads `bytes` as the fields of a testAllTypes; the object, or null when the read fails.
   ref<SarnObject> Read(const std::string& bytes) {
@@ -60,7 +58,7 @@ TEST_F(ProtoBufTest, WriterGivesExactBytes) {
   EXPECT_EQ(Json(Codec().UnmarshalWrapper(U(cancelBytes), 5)), Json(cancel));
 
   // An optional string whose presence byte is 0 is not written, whatever it holds.
-  ref<SarnObject> error = Make(sarnschema::Error::TYPE_ID);
+  ref<SarnObject> error = sarnschema::Error::Factory(&poolM);
   static_cast<sarnschema::Error*>(error.Get())->debugM = VekString("hidden");
   EXPECT_EQ(Write([&](const ProtoBuf& p, ProtoBufByteOutputStream* out) { p.Marshal(error.Get(), out); }),
             std::string("\x08\x00\x1A\x00", 4));

@@ -2,8 +2,6 @@
 // reader, driven by the tables under tests/data/rpc/. A wrapper is built from a one-line recipe and
 // shown as one line (Describe), so that every reader and setting is held to the same text. Then
 // the conversion to and from version-1 envelopes, from a table, and what it shares.
-#include <sstream>
-
 #include "runtime/ObjectOpsSupport.h"
 #include "testutil/AllocationFailure.h"
 
