@@ -22,7 +22,7 @@ using internal::TreeWalk;
 
 namespace {
 
-constexpr uint32_t kLinearNames = 8;
+constexpr uint32_t kLinearNames = 16;
 constexpr uint32_t kFirstIndexSlots = 32;
 
 uint64_t HashSeed() {

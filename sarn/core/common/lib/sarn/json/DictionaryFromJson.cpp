@@ -53,7 +53,10 @@ inline CursorByte* AsCursor(const Byte* p) { return reinterpret_cast<CursorByte*
 
 struct Frame {
   DictValue* pContainerM;  // owned by the tree
-  VekString keyM;          // object: the key of the member being read
+  // Object: the text of the key of the member being read, only for failure messages. Not a
+  // counted copy (two locked instructions per member): the reader's current key holds it until
+  // the member is added, and from then on the container's entry does, for the whole read.
+  const char* pKeyM;
   uint32_t indexM;         // array: the index of the element being read
   bool isObjectM;
 };
@@ -64,7 +67,6 @@ class FrameStack {
   explicit FrameStack(VekMempool* pool)
       : pMempoolM(pool), vFrameM(reinterpret_cast<Frame*>(vInlineM)), nFrameM(0), capacityM(kInline) {}
   ~FrameStack() {
-    for (uint32_t i = 0; i < nFrameM; ++i) vFrameM[i].~Frame();
     if (!IsInline()) pMempoolM->Free(vFrameM);
   }
   FrameStack(const FrameStack&) = delete;
@@ -72,10 +74,10 @@ class FrameStack {
 
   bool Push(DictValue* container, bool isObject) {
     if (nFrameM == capacityM && !Grow()) return false;
-    new (&vFrameM[nFrameM++]) Frame{container, VekString(), 0, isObject};
+    vFrameM[nFrameM++] = Frame{container, "", 0, isObject};
     return true;
   }
-  void Pop() { vFrameM[--nFrameM].~Frame(); }
+  void Pop() { --nFrameM; }
   Frame& Top() { return vFrameM[nFrameM - 1]; }
   Frame& At(uint32_t i) { return vFrameM[i]; }
   uint32_t Count() const { return nFrameM; }
@@ -86,11 +88,7 @@ class FrameStack {
   bool Grow() {
     Frame* frames = static_cast<Frame*>(pMempoolM->Malloc(sizeof(Frame) * capacityM * 2));
     if (frames == nullptr) return false;
-    for (uint32_t i = 0; i < nFrameM; ++i) {
-      new (&frames[i]) Frame{vFrameM[i].pContainerM, static_cast<VekString&&>(vFrameM[i].keyM), vFrameM[i].indexM,
-                             vFrameM[i].isObjectM};
-      vFrameM[i].~Frame();
-    }
+    std::memcpy(frames, vFrameM, sizeof(Frame) * nFrameM);
     if (!IsInline()) pMempoolM->Free(vFrameM);
     vFrameM = frames;
     capacityM *= 2;
@@ -223,12 +221,12 @@ bool HandReader::Fail(const char* message, const VekString& tail, bool isScalar,
   text.AppendString(message);
   text.AppendString(tail.Utf8());
   if (isScalar) text.AppendString(framesM.Top().isObjectM ? " for Object field " : " for Array element.");
-  if (isScalar && framesM.Top().isObjectM) text.AppendString(framesM.Top().keyM.Utf8());
+  if (isScalar && framesM.Top().isObjectM) text.AppendString(framesM.Top().pKeyM);
   for (uint32_t i = nFrame; i-- > 0;) {
     Frame& frame = framesM.At(i);
     if (frame.isObjectM) {
       text.AppendString(" Failed to parse value for key ");
-      text.AppendString(frame.keyM.Utf8());
+      text.AppendString(frame.pKeyM);
     } else {
       text.AppendString(frame.indexM == 0 ? " Failed to parse an array element." : " Failed to parse an array member.");
     }
@@ -303,7 +301,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         break;
       }
       p = SkipWhitespace(p + 1, end);
-      frame.keyM = key;
+      frame.pKeyM = key.Utf8();
     } else {
       frame.indexM = static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Count();
       if (frame.indexM >= kMaxValuesPerContainer) {
