@@ -243,6 +243,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
   int depth = rootDepth;
   Step step = OPEN;
   VekString key;
+  uint64_t keyHash = 0;  // set by the duplicate check of each key
   bool isOk = true;
   for (;;) {
     Frame& frame = framesM.Top();
@@ -291,7 +292,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         isOk = FailOwn(wasOutOfMemoryM ? kOutOfMemoryMessage : "Failed to parse a Dictionary key.");
         break;
       }
-      if (JsonReadSupport::Has(*static_cast<Dictionary*>(frame.pContainerM), key.Utf8(), key.NByte())) {
+      if (JsonReadSupport::Has(*static_cast<Dictionary*>(frame.pContainerM), key.Utf8(), key.NByte(), keyHash)) {
         isOk = FailOwn("Duplicate key: ", key);
         break;
       }
@@ -333,7 +334,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
       p = AsBytes(input.pCurM);
     }
     bool isAdded = frame.isObjectM ? JsonReadSupport::AddNew(*static_cast<Dictionary*>(frame.pContainerM),
-                                                             static_cast<VekString&&>(key), value)
+                                                             static_cast<VekString&&>(key), value, keyHash)
                                    : static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Add(value);
     if (!isAdded) {
       delete value;
