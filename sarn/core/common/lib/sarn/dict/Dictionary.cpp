@@ -24,6 +24,7 @@ namespace {
 
 constexpr uint32_t kLinearNames = 16;
 constexpr uint32_t kFirstIndexSlots = 32;
+constexpr uint32_t kRadixSortNames = 256;
 
 uint64_t HashSeed() {
   static const uint64_t seed = [] {
@@ -261,7 +262,7 @@ void Dictionary::GetSortedNames(VekStringArray& out) const {
   out.Sort();
 }
 
-void Dictionary::SortedFirsts(SortKey* out) const {
+void Dictionary::SortedFirsts(SortKey* out, SortKey* scratch) const {
   uint32_t n = 0;
   for (uint32_t i = 0; i < nEntryM; ++i) {
     if (vEntryM[i].lastOrOrdinalM < 0) continue;
@@ -290,8 +291,39 @@ void Dictionary::SortedFirsts(SortKey* out) const {
       for (; j > 0 && less(moving, out[j - 1]); --j) out[j] = out[j - 1];
       out[j] = moving;
     }
-  } else {
+    return;
+  }
+  if (scratch == nullptr || n < kRadixSortNames) {
     std::sort(out, out + n, less);
+    return;
+  }
+  // Many names: a stable radix sort on the prefixes, a pass for each byte that differs at all,
+  // then the runs of equal prefixes by their whole names. Comparison sorts fall to their slow
+  // paths on the names of wide objects ("k1", "k10", "k100", ...) and compare far more often.
+  uint32_t counts[8][256] = {};
+  for (uint32_t i = 0; i < n; ++i) {
+    for (int b = 0; b < 8; ++b) ++counts[b][(out[i].prefixM >> (8 * b)) & 0xFF];
+  }
+  SortKey* from = out;
+  SortKey* to = scratch;
+  for (int b = 0; b < 8; ++b) {
+    uint32_t* count = counts[b];
+    if (count[(from[0].prefixM >> (8 * b)) & 0xFF] == n) continue;  // the same byte in every prefix
+    uint32_t at = 0;
+    for (int v = 0; v < 256; ++v) {
+      uint32_t c = count[v];
+      count[v] = at;
+      at += c;
+    }
+    for (uint32_t i = 0; i < n; ++i) to[count[(from[i].prefixM >> (8 * b)) & 0xFF]++] = from[i];
+    std::swap(from, to);
+  }
+  if (from != out) std::memcpy(out, from, sizeof(SortKey) * n);
+  for (uint32_t i = 0; i < n;) {
+    uint32_t j = i + 1;
+    while (j < n && out[j].prefixM == out[i].prefixM) ++j;
+    if (j - i > 1) std::sort(out + i, out + j, less);
+    i = j;
   }
 }
 

@@ -150,7 +150,9 @@ class SARN_EXPORT Dictionary : public DictValue {
     uint64_t prefixM;
     int32_t entryM;
   };
-  void SortedFirsts(SortKey* out) const;
+  // The first entries of the names in name order, into `out` (room for every name). `scratch`,
+  // room for as many again or null, lets a large dictionary be sorted in linear time.
+  void SortedFirsts(SortKey* out, SortKey* scratch) const;
   bool EqualsDictionary(const Dictionary& other) const;
   friend class internal::TreeWalk;
   friend class TreeWriter;
