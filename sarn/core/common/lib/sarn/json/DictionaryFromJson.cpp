@@ -18,6 +18,7 @@
 #include "sarn/dict/Dictionary.h"
 #include "sarn/values/Json.h"
 #include "sarn/json/internal/JsonReadSupport.h"
+#include "sarn/json/internal/JsonTokenScan.h"
 
 namespace sarn {
 
@@ -144,8 +145,7 @@ class HandReader {
 bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text) {
   const Byte* start = p;
   if (*p == '"') {
-    const Byte* q = p + 1;
-    while (q < end && *q != '"' && *q != '\\' && *q != 0) ++q;
+    const Byte* q = internal::QuotedRunEnd(p + 1, end);
     if (q < end && *q == '"') {
       size_t n = static_cast<size_t>(q - start - 1);
       text = isKey ? supportM.Key(reinterpret_cast<const char*>(start + 1), n)
