@@ -113,7 +113,7 @@ unsigned Dictionary::CountOf(int32_t first) const {
 bool Dictionary::GrowEntries() {
   if (nEntryM < capacityM) return true;
   if (capacityM >= 0x40000000u) return false;
-  uint32_t capacity = capacityM == 0 ? 4 : capacityM * 2;
+  uint32_t capacity = capacityM == 0 ? 2 : capacityM < 8 ? capacityM * 2 : capacityM + capacityM / 2;
   Entry* entries = static_cast<Entry*>(pMempoolM->Malloc(sizeof(Entry) * capacity));
   if (entries == nullptr) return false;
   for (uint32_t i = 0; i < nEntryM; ++i) {
