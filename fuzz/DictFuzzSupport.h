@@ -83,8 +83,9 @@ bool AnyValue(const sarn::DictValue& value, const Test& test) {
       if (AnyValue(*array.GetValueAt(i), test)) return true;
     }
   }
+  if (value.kindM != DictValue::KIND_DICTIONARY) return false;
   const auto& dictionary = static_cast<const sarn::Dictionary&>(value);
-  return value.kindM == DictValue::KIND_DICTIONARY && AnyName(dictionary, [&](const VekString& name) {
+  return AnyName(dictionary, [&](const VekString& name) {
            VekArray<DictValue> values(nullptr);
            dictionary.GetRange(name, values);
            for (int k = 0; k < values.Count(); ++k) {

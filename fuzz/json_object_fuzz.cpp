@@ -41,9 +41,9 @@ bool HoldsPathDifference(const SarnObject* object) {
 // True when a dictionary of the tree repeats a name.
 bool RepeatsName(const Dictionary& tree) {
   return dictfuzz::AnyValue(tree, [](const DictValue& value) {
+    if (value.kindM != DictValue::KIND_DICTIONARY) return false;
     const auto& dictionary = static_cast<const Dictionary&>(value);
-    return value.kindM == DictValue::KIND_DICTIONARY &&
-           dictfuzz::AnyName(dictionary, [&](const VekString& name) { return dictionary.CountValues(name) > 1; });
+    return dictfuzz::AnyName(dictionary, [&](const VekString& name) { return dictionary.CountValues(name) > 1; });
   });
 }
 
