@@ -21,15 +21,24 @@ namespace fs = std::filesystem;
 
 namespace {
 
-std::string SourceDir() {
-  const char* dir = std::getenv("SARN_SOURCE_DIR");
-  return dir != nullptr ? dir : ".";  // ctest sets it
-}
+std::string SourceDir() { return std::getenv("SARN_SOURCE_DIR") != nullptr ? std::getenv("SARN_SOURCE_DIR") : "."; }
 
 std::string DataDir() { return SourceDir() + "/tests/data/generator"; }
 
-// The generator built beside this test (build/tests/X -> build/tools/schemagen/schemagen).
-std::string Tool() { return (fs::read_symlink("/proc/self/exe").parent_path().parent_path() / "tools/schemagen/schemagen").string(); }
+// A folder of its own for one test, removed with it.
+struct TempDir {
+  std::string pathM = (fs::temp_directory_path() / "schemagen-XXXXXX").string();
+  TempDir() { pathM = mkdtemp(pathM.data()) != nullptr ? pathM : ""; }
+  ~TempDir() {
+    std::error_code ec;
+    fs::remove_all(pathM, ec);
+  }
+  const std::string& Path() const { return pathM; }
+  std::string Write(const std::string& name, const std::string& text) const {
+    std::ofstream(pathM + "/" + name, std::ios::binary) << text;
+    return pathM + "/" + name;
+  }
+};
 
 struct Outcome {
   int status;
@@ -37,44 +46,20 @@ struct Outcome {
   std::string err;
 };
 
+// The generator built beside this test (build/tests/X -> build/tools/schemagen/schemagen).
 Outcome Schemagen(const std::string& args) {
-  static int counter = 0;
-  std::string errFile = (fs::temp_directory_path() / ("schemagen-err-" + std::to_string(getpid()) + "-" +
-                                                      std::to_string(counter++))).string();
-  std::string command = Tool() + " " + args + " 2>" + errFile;
+  TempDir dir;
+  std::string tool = (fs::read_symlink("/proc/self/exe").parent_path().parent_path() / "tools/schemagen/schemagen").string();
+  FILE* pipe = popen((tool + " " + args + " 2>" + dir.Path() + "/err").c_str(), "r");
   Outcome run{-1, "", ""};
-  FILE* pipe = popen(command.c_str(), "r");
   if (pipe == nullptr) return run;
   char buffer[4096];
-  size_t n;
-  while ((n = fread(buffer, 1, sizeof buffer, pipe)) > 0) run.out.append(buffer, n);
+  for (size_t n; (n = fread(buffer, 1, sizeof buffer, pipe)) > 0;) run.out.append(buffer, n);
   int status = pclose(pipe);
   run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  sarntest::ReadFile(errFile, run.err);
-  fs::remove(errFile);
+  sarntest::ReadFile(dir.Path() + "/err", run.err);
   return run;
 }
-
-class TempDir {
- public:
-  TempDir() {
-    std::string pattern = (fs::temp_directory_path() / "schemagen-XXXXXX").string();
-    pathM = mkdtemp(pattern.data()) != nullptr ? pattern : "";
-  }
-  ~TempDir() {
-    std::error_code ec;
-    fs::remove_all(pathM, ec);
-  }
-  const std::string& Path() const { return pathM; }
-  std::string Write(const std::string& name, const std::string& text) const {
-    std::string path = pathM + "/" + name;
-    std::ofstream(path, std::ios::binary) << text;
-    return path;
-  }
-
- private:
-  std::string pathM;
-};
 
 }  // namespace
 
@@ -177,9 +162,9 @@ TEST(Schemagen, OutputIsDeterministicAndRewritesNothingUnchanged) {
 }
 
 TEST(Schemagen, CommandLine) {
-  EXPECT_EQ(Schemagen("").status, 2);
-  EXPECT_EQ(Schemagen(DataDir() + "/fixture.schema --frobnicate").status, 2);
-  EXPECT_EQ(Schemagen(DataDir() + "/fixture.schema --out /tmp --units 0").status, 2);
+  for (const std::string args : {"", " --frobnicate", " --out /tmp --units 0"}) {
+    EXPECT_EQ(Schemagen(args.empty() ? args : DataDir() + "/fixture.schema" + args).status, 2) << args;
+  }
   Outcome missing = Schemagen("/nonexistent/x.schema --check");
   EXPECT_EQ(missing.status, 1);
   EXPECT_EQ(missing.err, "/nonexistent/x.schema: cannot read the schema description\n");

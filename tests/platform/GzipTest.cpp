@@ -12,6 +12,7 @@ using wynbaselib::Bytesource;
 using wynbaselib::GunzipBytesource;
 using wynbaselib::GzipBytesink;
 using wynbaselib::InMemoryBytestream;
+using sarntest::ReadAll;
 
 // Text that compresses, with enough variety to need several deflate blocks.
 std::string SampleText(size_t n) {
@@ -33,13 +34,6 @@ std::string Gzip(const std::string& text, size_t writeSize = 1000) {
   }
   EXPECT_TRUE(sink.Flush());
   return out.GetContent();
-}
-
-std::string ReadAll(Bytesource& source, size_t block) {
-  std::string out;
-  std::string buffer(block, '\0');
-  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
-  return out;
 }
 
 struct Gunzipped {

@@ -13,13 +13,7 @@ namespace {
 
 using wynbaselib::Bytesource;
 using wynbaselib::InMemoryBytestream;
-
-std::string ReadAll(Bytesource& source, size_t block) {
-  std::string out;
-  std::string buffer(block, '\0');
-  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
-  return out;
-}
+using sarntest::ReadAll;
 
 TEST(StreamTest, InMemoryCopiesShareContentAndReadFromTheirOwnPosition) {
   InMemoryBytestream stream("hello");

@@ -242,11 +242,10 @@ TEST_F(DictionaryObjectTest, FilledObjectsRoundTrip) {
   ref<SarnObject> all = sarnschema::TestAllTypes::Factory(&poolM);
   sarntest::FillObject(&poolM, all.Get(), 1, 3);
   const std::string text = Json(all.Get(), 0);
-  // Every field is there, arrays of dictionaries and the escaped texts included.
-  EXPECT_NE(text.find("\"anyDictMulti\": [{\"key\": \"value\", \"n\": \"1\"},{\"key\": \"value\", \"n\": \"1\"}]"),
-            std::string::npos)
-      << text;
-  EXPECT_NE(text.find("\"idAnyBodyOptional\": \"Text "), std::string::npos) << text;
+  for (const FieldInfo& field : sarnschema::TestAllTypes::vFieldInfoG) {  // every field is there
+    const char* name = FieldName(all->GetStructInfo(), field);
+    EXPECT_TRUE(field.arity == SARN_ARITY_NONE || text.find("\"" + std::string(name) + "\": ") != std::string::npos) << name;
+  }
   ExpectRoundTrips(all.Get(), 0);
   for (unsigned id : {191u, 219u, 346u, 463u, 470u, 975u, 2416u}) {
     ref<SarnObject> object = StructInfoForId(id)->pFactory(&poolM);

@@ -154,12 +154,16 @@ TEST(SchemaTables, RepresentativeTypesFieldForField) {
   EXPECT_EQ(Type("kernoCurrentTimeGet")->nFieldInfo, 1);
 }
 
-TEST(SchemaTables, TypesIdsNamesAndPrefixes) {
+// Every type of the list (all of them: the registry holds no other) has its id, name and prefix,
+// is found by its name within five probes, and its factory makes an object of it whose optional
+// fields are all absent.
+TEST(SchemaTables, TypesIdsNamesPrefixesLookupsAndFactories) {
+  VekMempool pool("factories");
   std::string text;
   ASSERT_TRUE(sarntest::ReadFile(std::string(getenv("SARN_SOURCE_DIR")) + "/tests/data/generator/default-types.txt", text));
   std::istringstream in(text);
   std::string line;
-  int count = 0, prefixes = 0;
+  int count = 0, prefixes = 0, worst = 0, filled = 0, slots = 0;
   std::set<std::string> distinctPrefixes;
   const EnumDef* typeNames = EnumDefForId(1361);
   ASSERT_NE(typeNames, nullptr);
@@ -181,15 +185,36 @@ TEST(SchemaTables, TypesIdsNamesAndPrefixes) {
       EXPECT_TRUE(prefix.rfind("vask:", 0) == 0 && prefix.back() == '.') << prefix;
     }
     ++count;
+    EXPECT_EQ(StructInfoMap::LookupStructByName(info->pName), info);
+    ref<SarnObject> object = info->pFactory(&pool);
+    ASSERT_TRUE(object) << info->pName;
+    EXPECT_TRUE(object->GetRefCount() == 1 && object->GetTypeId() == static_cast<uint32_t>(id) &&
+                object->GetMempool() == &pool && object->GetStructInfo() == info && object->GetTypeName() == info->pName)
+        << info->pName;
+    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
+      const FieldInfo& f = info->vFieldInfo[n];
+      EXPECT_FALSE(f.arity == SARN_ARITY_OPTIONAL && IsFieldPresent(object.Get(), f)) << info->pName << " " << n;
+    }
+    uint32_t slot = StructInfoMap::HomeSlot(info->pName, Schema::structNameHashTableSizeG);
+    int probes = 1;
+    for (; Schema::structNameHashTableG[slot] != info; ++probes) slot = (slot + 1) % Schema::structNameHashTableSizeG;
+    worst = std::max(worst, probes);
   }
-  int filled = 0;
+  EXPECT_LE(worst, 5);
   for (int id = 0; id < Schema::nStructDefG; ++id) filled += Schema::vStructDefG[id] != nullptr;
-  EXPECT_EQ(std::vector<int>({count, prefixes, int(distinctPrefixes.size()), filled, Schema::nStructDefG,
+  for (int slot = 0; slot < Schema::structNameHashTableSizeG; ++slot) slots += Schema::structNameHashTableG[slot] != nullptr;
+  EXPECT_EQ(std::vector<int>({count, prefixes, int(distinctPrefixes.size()), filled, slots, Schema::nStructDefG,
                               Schema::nStructTypeG, Schema::firstSchemaVersionG, Schema::lastSchemaVersionG,
-                              Schema::defaultSchemaVersionG}),
-            std::vector<int>({1272, 92, 92, 1272, 5919, 1272, 7, 42, 42}));
+                              Schema::defaultSchemaVersionG, Schema::structNameHashTableSizeG}),
+            std::vector<int>({1272, 92, 92, 1272, 1272, 5919, 1272, 7, 42, 42, 3532}));
   EXPECT_EQ(StructInfoForId(5919), nullptr);
   EXPECT_EQ(StructInfoForId(-1), nullptr);
+  EXPECT_EQ(StructInfoMap::HomeSlot("ad", 3532), 3107u);
+  EXPECT_EQ(StructInfoMap::LookupStructByName("address"), &sarnschema::Address::structInfoG);
+  for (const char* miss : {"Address", "", "addres", "addressX"}) EXPECT_EQ(StructInfoMap::LookupStructByName(miss), nullptr) << miss;
+  EXPECT_EQ(StructInfoMap::LookupStructByName(nullptr), nullptr);
+  EXPECT_EQ(sarnschema::Ad::Factory(&pool)->GetTypeId(), 140u);
+  EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }
 
 TEST(SchemaTables, PublishedStatistics) {
@@ -280,39 +305,4 @@ TEST(SchemaTables, FieldSelectionByVersion) {
   EXPECT_TRUE(FieldTakesPart(imageUrl, 0) && FieldTakesPart(imageUrl, 7));
   EXPECT_FALSE(FieldTakesPart(imageUrl, 8));
   EXPECT_FALSE(FieldTakesPart(ad->vFieldInfo[0], 0));
-}
-
-// Every type is found by its name within five probes, and its factory makes an object of it whose
-// optional fields are all absent.
-TEST(SchemaTables, LookupByNameAndFactories) {
-  VekMempool pool("factories");
-  EXPECT_EQ(Schema::structNameHashTableSizeG, 3532);
-  int filled = 0, worst = 0;
-  for (int slot = 0; slot < Schema::structNameHashTableSizeG; ++slot) filled += Schema::structNameHashTableG[slot] != nullptr;
-  EXPECT_EQ(filled, 1272);
-  EXPECT_EQ(StructInfoMap::HomeSlot("ad", 3532), 3107u);
-  for (int id = 0; id < Schema::nStructDefG; ++id) {
-    const StructInfo* info = Schema::vStructDefG[id];
-    if (info == nullptr) continue;
-    EXPECT_EQ(StructInfoMap::LookupStructByName(info->pName), info);
-    ref<SarnObject> object = info->pFactory(&pool);
-    ASSERT_TRUE(object) << info->pName;
-    EXPECT_TRUE(object->GetRefCount() == 1 && object->GetTypeId() == static_cast<uint32_t>(id) &&
-                object->GetMempool() == &pool && object->GetStructInfo() == info && object->GetTypeName() == info->pName)
-        << info->pName;
-    for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-      const FieldInfo& f = info->vFieldInfo[n];
-      EXPECT_FALSE(f.arity == SARN_ARITY_OPTIONAL && IsFieldPresent(object.Get(), f)) << info->pName << " " << n;
-    }
-    uint32_t slot = StructInfoMap::HomeSlot(info->pName, Schema::structNameHashTableSizeG);
-    int probes = 1;
-    for (; Schema::structNameHashTableG[slot] != info; ++probes) slot = (slot + 1) % Schema::structNameHashTableSizeG;
-    worst = std::max(worst, probes);
-  }
-  EXPECT_LE(worst, 5);
-  EXPECT_EQ(StructInfoMap::LookupStructByName("address"), &sarnschema::Address::structInfoG);
-  for (const char* miss : {"Address", "", "addres", "addressX"}) EXPECT_EQ(StructInfoMap::LookupStructByName(miss), nullptr) << miss;
-  EXPECT_EQ(StructInfoMap::LookupStructByName(nullptr), nullptr);
-  EXPECT_EQ(sarnschema::Ad::Factory(&pool)->GetTypeId(), 140u);
-  EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }

@@ -54,6 +54,13 @@ inline ref<sarn::SarnObject> ReadKnownDict(VekMempool* pool, const std::string& 
   return object;
 }
 
+// Everything a byte source delivers, read `block` bytes at a time.
+inline std::string ReadAll(wynbaselib::Bytesource& source, size_t block) {
+  std::string out, buffer(block, '\0');
+  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
+  return out;
+}
+
 // Splits `input` into chunks of `size` bytes (the last one shorter).
 inline std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
   std::vector<std::string_view> chunks;

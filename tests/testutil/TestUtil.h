@@ -32,9 +32,6 @@ class PoolTest : public ::testing::Test {
 // multiply frame sizes, so they get eight times the room; the promise is about release builds.
 void RunOnStack(size_t bytes, const std::function<void()>& work);
 
-// A folder of the shared public corpora, or "" when it is absent (tests then skip).
-std::string CorpusDir(const std::string& name);
-
 // Reads a whole file; false when it cannot be read.
 bool ReadFile(const std::string& path, std::string& out);
 
