@@ -3,7 +3,7 @@
 // library.
 #pragma once
 
-#include "testutil/RandomObject.h"
+#include "RandomObject.h"  // beside this file: benchmarks include it by path
 
 namespace sarntest {
 
