@@ -41,7 +41,7 @@ TEST_F(ByteStringTest, ByteBufferAppendsToExactlyTheNewLength) {
   EXPECT_EQ(b->GetCapacity(), 8u) << "at least 8 bytes";
   ASSERT_TRUE(b->Append("defghijkl", 9));
   EXPECT_EQ(b->GetCapacity(), 12u) << "exactly the new length";
-  EXPECT_EQ(Bytes(b->GetData(), b->GetLength()), "abcdefghijkl");
+  EXPECT_EQ(sarntest::Contents(*b), "abcdefghijkl");
   // A length that would pass 2 GiB is refused before anything is touched.
   EXPECT_FALSE(b->Append("x", static_cast<size_t>(INT_MAX)));
   EXPECT_EQ(b->GetLength(), 12u);

@@ -8,9 +8,7 @@ namespace {
 
 using ByteBufferTest = sarntest::PoolTest;
 
-std::string Contents(const sarn::ByteBuffer& buffer) {
-  return std::string(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength());
-}
+using sarntest::Contents;
 
 unsigned long Capacity(const sarn::ByteBuffer& buffer) { return buffer.bufferM.bytesM->GetLength(); }
 
@@ -75,7 +73,7 @@ TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
   const unsigned char run[] = {'X', 'Y', 'Z'};
   ASSERT_TRUE(core->AppendBytes(run, 3));
   EXPECT_TRUE(core->GetLength() == 20 && core->GetCapacity() == 20) << "a run reallocates to exactly the new length";
-  EXPECT_EQ(std::string(reinterpret_cast<const char*>(core->GetData()), core->GetLength()), "abcdefghijklmnopqXYZ");
+  EXPECT_EQ(Contents(*core), "abcdefghijklmnopqXYZ");
   // Only the low 32 bits of a run's length count.
   EXPECT_TRUE(core->AppendBytes(run, 1ul << 32));
   EXPECT_EQ(core->GetLength(), 20u);

@@ -161,17 +161,10 @@ TEST_F(DictValueTest, EqualityFollowsTheReceiversRule) {
   // {a: 1, <second>: 2, x: x1, x: x2}, with the names added in reverse order when asked.
   auto make = [this](bool isReversed, const char* second, const char* x1, const char* x2) {
     ref<Dictionary> d = new (&poolM) Dictionary();
-    if (isReversed) {
-      d->Add(VekString("x"), VekString(x1));
-      d->Add(VekString(second), Bare(&poolM, "2"));
-      d->Add(VekString("x"), VekString(x2));
-      d->Add(VekString("a"), Bare(&poolM, "1"));
-    } else {
-      d->Add(VekString("a"), Bare(&poolM, "1"));
-      d->Add(VekString(second), Bare(&poolM, "2"));
-      d->Add(VekString("x"), VekString(x1));
-      d->Add(VekString("x"), VekString(x2));
-    }
+    std::vector<std::pair<const char*, ref<DictValue>>> adds = {
+        {"a", Bare(&poolM, "1")}, {second, Bare(&poolM, "2")}, {"x", StringValue::Make(x1, &poolM)}, {"x", StringValue::Make(x2, &poolM)}};
+    if (isReversed) adds = {adds[2], adds[1], adds[3], adds[0]};
+    for (const auto& [name, value] : adds) d->Add(VekString(name), value);
     return d;
   };
   ref<Dictionary> a = make(false, "b", "p", "q");
@@ -244,12 +237,7 @@ TEST_F(DictValueTest, ReleasesHandBuiltTreesOfAnyDepthInFlatStack) {
     ref<DictValue> root = new (&poolM) Dictionary();
     DictValue* inner = root.Get();
     for (int level = 0; level < 300000; ++level) {
-      ref<DictValue> child;
-      if (level % 3 == 0) {
-        child = new (&poolM) ArrayValue();
-      } else {
-        child = new (&poolM) Dictionary();
-      }
+      ref<DictValue> child = level % 3 == 0 ? ref<DictValue>(new (&poolM) ArrayValue()) : new (&poolM) Dictionary();
       if (inner->kindM == DictValue::KIND_ARRAY) {
         static_cast<ArrayValue*>(inner)->Add(child);
       } else if (level % 3 == 2) {

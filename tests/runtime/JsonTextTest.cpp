@@ -20,7 +20,7 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, buffer));
   StringSink sink;
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, sink));
-  std::string fromBuffer(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength());
+  std::string fromBuffer = sarntest::Contents(buffer);
   EXPECT_EQ(fromBuffer, sink.textM) << "the two sinks disagree";
   return fromBuffer;
 }

@@ -87,9 +87,7 @@ void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, M
   }
   VekCore* value = FieldAccess::ReferenceAt(object, field, i);
   if (field.dataType == SARN_DATA_TYPE_BYTESTRING) {
-    auto* bytes = static_cast<const vek::ByteBuffer*>(value);
-    return put(std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength()), &Reflection::AddString,
-               &Reflection::SetString);
+    return put(sarntest::Contents(*static_cast<const vek::ByteBuffer*>(value)), &Reflection::AddString, &Reflection::SetString);
   }
   Message* message = isMulti ? r->AddMessage(out, fd) : r->MutableMessage(out, fd);
   switch (field.dataType) {

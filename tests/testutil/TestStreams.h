@@ -18,11 +18,15 @@ inline void Require(bool condition) {
   if (!condition) std::abort();
 }
 
+// The bytes of anything that holds bytes (GetData and GetLength: buffers, byte strings).
+template <typename Bytes>
+std::string Contents(const Bytes& bytes) {
+  return std::string(reinterpret_cast<const char*>(bytes.GetData()), bytes.GetLength());
+}
+
 // The bytes of a string or a byte string, NUL bytes included.
 inline std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
-inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
-  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
-}
+inline std::string Str(const ref<vek::ByteBuffer>& bytes) { return Contents(*bytes); }
 
 // The protocol-buffer varint of `value`.
 inline std::string Varint(uint64_t value) {
