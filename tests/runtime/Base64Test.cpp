@@ -52,13 +52,7 @@ TEST_F(Base64Pool, EncodesWithPaddingAndBothCodeSets) {
 }
 
 TEST_F(Base64Pool, DecodeAcceptsPaddingOnlyAtTheEnd) {
-  // The character after padding is not examined; unused low bits are ignored.
-  const std::pair<std::string, const char*> cases[] = {
-      {"Zm9v", "foo"}, {"Zm8=", "fo"}, {"Zg==", "f"}, {"", ""}, {"Zg=x", "f"}, {"Zm8=Zg==", "<fail>"},
-      {"Zg==Zm9v", "<fail>"}, {"Zm9", "<fail>"}, {"Z!==", "<fail>"}, {"Z===", "<fail>"}, {"====", "<fail>"},
-      {"Zm9vZm8x", "foofo1"}, {"Zm9vZ!8x", "<fail>"}, {"Zm9vZm8", "<fail>"}, {std::string("Zm\0v", 4), "<fail>"},
-      {"Zh==", "f"}, {"Zm9=x", "<fail>"}};
-  for (const auto& [text, bytes] : cases) EXPECT_EQ(Decode(text), bytes) << text;
+  for (const auto& row : sarntest::ReadTable("values/base64-decode.txt", 2)) EXPECT_EQ(Decode(row[0]), row[1]) << row[0];
 }
 
 TEST_F(Base64Pool, BadCodeSetsAreRejected) {

@@ -138,18 +138,16 @@ TEST_F(JsonTextTest, QuotedStringStraddlesTheBlockBoundary) {
   EXPECT_EQ(plainCursor.Peek(), 0);
 }
 
-TEST_F(JsonTextTest, CursorOverMemoryNeverReadsItsSource) {
+// A cursor over memory has everything delivered at once and never reads a source; one over a
+// source counts what each refill delivered and never reads an ended source again.
+TEST_F(JsonTextTest, CursorsCountDeliveredBytesAndStopAtTheEnd) {
   const char text[] = " \t x";
-  sarn::InputPointerBytesource cursor(reinterpret_cast<const unsigned char*>(text), 4);
-  EXPECT_EQ(cursor.BytesDelivered(), 4u);
-  cursor.SkipWhitespace();
-  EXPECT_EQ(std::string({cursor.Peek(), cursor.Next()}), "xx");
-  EXPECT_EQ(cursor.Next(), 0);
-  EXPECT_FALSE(cursor.Refill());
-  EXPECT_EQ(cursor.BytesDelivered(), 4u);
-}
+  sarn::InputPointerBytesource memory(reinterpret_cast<const unsigned char*>(text), 4);
+  EXPECT_EQ(memory.BytesDelivered(), 4u);
+  memory.SkipWhitespace();
+  EXPECT_EQ(std::string({memory.Peek(), memory.Next()}), "xx");
+  EXPECT_TRUE(memory.Next() == 0 && !memory.Refill() && memory.BytesDelivered() == 4u);
 
-TEST_F(JsonTextTest, RefillCountsDeliveredBytesAndStopsAtTheEnd) {
   ChunkSource source({"ab", "cde", "", "f"});
   sarn::InputPointerBytesource cursor(&source);
   EXPECT_EQ(cursor.BytesDelivered(), 0u);
