@@ -69,10 +69,8 @@ TEST(SpinLockTest, ExcludesAcrossThreads) {
       ++counter;
     }
   };
-  std::thread a(add), b(add), c(add);
-  a.join();
-  b.join();
-  c.join();
+  std::thread threads[] = {std::thread(add), std::thread(add), std::thread(add)};
+  for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(counter, 600000);
   ASSERT_TRUE(lock.TryLock());
   EXPECT_FALSE(lock.TryLock()) << "not recursive";
