@@ -20,8 +20,8 @@ TEST_F(DictionaryJsonReaderTest, AcceptsTolerantShapesAndRefusesWithMessages) {
   }
   ref<Dictionary> tree = Read(&poolM, "{a:true, q:\"x\", u:\"\\u0041\"}");
   ASSERT_TRUE(tree);
-  EXPECT_FALSE(static_cast<StringValue*>(tree->Get(VekString("a")).Get())->needQuotesM);
-  EXPECT_TRUE(static_cast<StringValue*>(tree->Get(VekString("q")).Get())->needQuotesM);
+  EXPECT_TRUE(!static_cast<StringValue*>(tree->Get(VekString("a")).Get())->needQuotesM &&
+              static_cast<StringValue*>(tree->Get(VekString("q")).Get())->needQuotesM);
   EXPECT_EQ(Str(tree->GetString(VekString("u"))), "\\u0041") << "backslash-u stays as written";
 }
 
@@ -36,7 +36,7 @@ TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
   VekString error;
   EXPECT_TRUE(d->ReadFieldValue(input, VekString("arr"), error));
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(input.pCurM), input.pEndM - input.pCurM), " rest");
-  EXPECT_TRUE(d->ReadFieldValue(input, VekString("word"), error));
+  EXPECT_TRUE(d->ReadFieldValue(input, VekString("word"), error)) << Str(error);
   EXPECT_EQ(Compact(d), R"({"arr": [1, {"k": x}], "word": rest})");
 
   const std::string bad = " }";
@@ -71,9 +71,7 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
     std::string text = Compact(tree);
     EXPECT_EQ(text.size(), atLimit.size() + (limit / 2) * 1);  // a space after each colon
     ref<Dictionary> again = Read(&poolM, text);
-    ASSERT_TRUE(again);
-    EXPECT_TRUE(tree->Equals(again));
-    EXPECT_EQ(Pretty(tree).size() > text.size(), true);
+    EXPECT_TRUE(again && tree->Equals(again) && Pretty(tree).size() > text.size());
   });
   // Objects only, the costlier frames of the writer.
   std::string objects;
@@ -95,8 +93,7 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
 
   // A limit of our own, with the exact joined text.
   JsonLimits three(3);
-  EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three));
-  EXPECT_FALSE(Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
+  EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three) && !Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
   EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 3 levels. Failed to parse value for key b "
                    "Failed to parse an array member. Failed to parse value for key a");
   EXPECT_FALSE(Read(&poolM, "{}", &error, JsonLimits(0)));
@@ -123,9 +120,7 @@ TEST_F(DictionaryJsonReaderTest, MatchesGoldenForms) {
   ASSERT_TRUE(streamed) << error;
   EXPECT_FALSE(streamed->Equals(tree)) << "only the streaming parser decodes the \\u escape of the title";
   EXPECT_EQ(Str(streamed->GetString(VekString("title"))), "Caf\xC3\xA9 \"news\"\tfeed");
-  streamed->Remove(VekString("title"));
-  tree->Remove(VekString("title"));
-  EXPECT_TRUE(streamed->Equals(tree));
+  EXPECT_TRUE(streamed->Remove(VekString("title")) && tree->Remove(VekString("title")) && streamed->Equals(tree));
 }
 
 }  // namespace
