@@ -125,17 +125,14 @@ TEST_F(JsonTextTest, QuotedStringStraddlesTheBlockBoundary) {
   sarn::InputPointerBytesource cursor(&source);
   VekString result;
   ASSERT_TRUE(JsonBytesourceToString(&poolM, nullptr, cursor, result));
-  EXPECT_EQ(Str(result), fromMemory.text);
-  EXPECT_EQ(result.NByte(), body.size() / 12 * 11);
-  EXPECT_EQ(cursor.BytesDelivered(), input.size());
-  EXPECT_EQ(cursor.Next(), 't');
+  EXPECT_TRUE(Str(result) == fromMemory.text && result.NByte() == body.size() / 12 * 11);
+  EXPECT_TRUE(cursor.BytesDelivered() == input.size() && cursor.Next() == 't');
   // Without escapes the straddling run is gathered without losing a byte either.
   std::string plain = std::string(16380, ' ') + "\"0123456789\"";
   wynbaselib::InMemoryBytestream plainSource(plain);
   sarn::InputPointerBytesource plainCursor(&plainSource);
   ASSERT_TRUE(JsonBytesourceToString(&poolM, nullptr, plainCursor, result));
-  EXPECT_EQ(Str(result), "0123456789");
-  EXPECT_EQ(plainCursor.Peek(), 0);
+  EXPECT_TRUE(Str(result) == "0123456789" && plainCursor.Peek() == 0);
 }
 
 // A cursor over memory has everything delivered at once and never reads a source; one over a
@@ -151,15 +148,12 @@ TEST_F(JsonTextTest, CursorsCountDeliveredBytesAndStopAtTheEnd) {
   ChunkSource source({"ab", "cde", "", "f"});
   sarn::InputPointerBytesource cursor(&source);
   EXPECT_EQ(cursor.BytesDelivered(), 0u);
-  EXPECT_EQ(cursor.Peek(), 'a');
-  EXPECT_EQ(cursor.BytesDelivered(), 2u);
+  EXPECT_TRUE(cursor.Peek() == 'a' && cursor.BytesDelivered() == 2);
   std::string seen;
   while (char c = cursor.Next()) seen += c;
-  EXPECT_EQ(seen, "abcdef");
-  EXPECT_EQ(cursor.BytesDelivered(), 6u);
+  EXPECT_TRUE(seen == "abcdef" && cursor.BytesDelivered() == 6);
   int reads = source.nReadM;
-  EXPECT_EQ(cursor.Next(), 0);
-  EXPECT_FALSE(cursor.Refill());
+  EXPECT_TRUE(cursor.Next() == 0 && !cursor.Refill());
   EXPECT_EQ(source.nReadM, reads) << "an ended source is not read again";
 }
 
@@ -174,8 +168,7 @@ TEST_F(JsonTextTest, EchoCopiesExactlyTheConsumedBytesAcrossBlocks) {
     cursor.StartEcho(&sink);
     cursor.Next();
     while (cursor.Peek() == 'e') cursor.Next();
-    EXPECT_TRUE(cursor.StopEcho());
-    EXPECT_EQ(cursor.Next(), 'y');
+    EXPECT_TRUE(cursor.StopEcho() && cursor.Next() == 'y');
     EXPECT_EQ(sink.textM, "x" + std::string(40000, 'e'));
   }
   ChunkSource source({"abc", "def"});
@@ -184,8 +177,7 @@ TEST_F(JsonTextTest, EchoCopiesExactlyTheConsumedBytesAcrossBlocks) {
   failing.fFailM = true;
   cursor.StartEcho(&failing);
   for (int i = 0; i < 4; ++i) cursor.Next();
-  EXPECT_FALSE(cursor.StopEcho());
-  EXPECT_EQ(failing.textM, "abcd");
+  EXPECT_TRUE(!cursor.StopEcho() && failing.textM == "abcd");
 }
 
 }  // namespace
