@@ -56,10 +56,9 @@ TEST(SarnUtilTest, EnumNamesAndNumbers) {
 TEST(SarnUtilTest, ObjectIdAndTypeText) {
   // Prefix, id, " - " and the type's name; no prefix for types without one; nothing for a type
   // id that names no type.
-  EXPECT_EQ(Str(sarn::ObjectIdAndType(4294967295u, 191).ToString()), "vask:ds.4294967295 - address");
-  EXPECT_EQ(Str(sarn::ObjectIdAndType(5, 543).ToString()), "5 - success");
-  EXPECT_EQ(Str(sarn::ObjectIdAndType(0, 140).ToString()), "vask:ad.0 - ad");
-  EXPECT_EQ(Str(sarn::ObjectIdAndType(5, 0xFFFF).ToString()), "");
+  EXPECT_EQ(Str(sarn::ObjectIdAndType(4294967295u, 191).ToString()) + "|" + Str(sarn::ObjectIdAndType(5, 543).ToString()) +
+                "|" + Str(sarn::ObjectIdAndType(0, 140).ToString()) + "|" + Str(sarn::ObjectIdAndType(5, 0xFFFF).ToString()),
+            "vask:ds.4294967295 - address|5 - success|vask:ad.0 - ad|");
   EXPECT_TRUE(sarn::ObjectIdAndType::nil == sarn::ObjectIdAndType() && sarn::ObjectIdAndType::nil.objectIdM == 0 &&
               sarn::ObjectIdAndType::nil.typeIdM == 0);
 }

@@ -58,10 +58,8 @@ TEST_P(ScalarTypesTest, ParsedTexts) {
 }
 
 TEST_P(ScalarTypesTest, ChannelNumbers) {
-  EXPECT_EQ(Str(ChannelNumber(-2, 7).ToString()), "-2-7");
-  EXPECT_EQ(Str(ChannelNumber(-1).ToString()), "-1");
-  EXPECT_EQ(ChannelNumber(), ChannelNumber::INVALID);
-  EXPECT_NE(ChannelNumber(5, 1), ChannelNumber(5, 2));
+  EXPECT_EQ(Str(ChannelNumber(-2, 7).ToString()) + " " + Str(ChannelNumber(-1).ToString()), "-2-7 -1");
+  EXPECT_TRUE(ChannelNumber() == ChannelNumber::INVALID && ChannelNumber(5, 1) != ChannelNumber(5, 2));
   ChannelNumber copy;
   copy = ChannelNumber(7, 3);
   EXPECT_TRUE(copy.majorM == 7 && copy.minorM == 3);
@@ -70,12 +68,9 @@ TEST_P(ScalarTypesTest, ChannelNumbers) {
 TEST_P(ScalarTypesTest, Currencies) {
   Currency usd = Currency::Parse(Text("USD.1999"));
   EXPECT_TRUE(usd.amountM == 1999 && std::string(usd.codeM) == "USD");
-  EXPECT_EQ(usd, Currency(1999, "USD"));
-  EXPECT_NE(usd, Currency(1999, "EUR"));
-  EXPECT_EQ(Currency(5, "EURO"), Currency::INVALID);
-  EXPECT_EQ(Str(Currency(5, "EURO").ToString()), "invalid");
-  EXPECT_EQ(Currency(5, nullptr), Currency::INVALID);
-  EXPECT_EQ(Str(Currency(-5, "USD").ToString()), "USD.-5");
+  EXPECT_TRUE(usd == Currency(1999, "USD") && usd != Currency(1999, "EUR"));
+  EXPECT_TRUE(Currency(5, "EURO") == Currency::INVALID && Currency(5, nullptr) == Currency::INVALID);
+  EXPECT_EQ(Str(Currency(5, "EURO").ToString()) + " " + Str(Currency(-5, "USD").ToString()), "invalid USD.-5");
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(&Currency::INVALID), sizeof(Currency)),
             std::string(sizeof(Currency), '\0'));
   Currency full;
@@ -158,8 +153,7 @@ TEST(StringUtilTest, SplitAndReplace) {
           << row[0] << " " << row[1];
     }
     pieces.Add(VekString("kept"));
-    EXPECT_FALSE(SplitString(Text("abc"), Text(","), pieces));
-    EXPECT_EQ(pieces.Count(), 1);
+    EXPECT_TRUE(!SplitString(Text("abc"), Text(","), pieces) && pieces.Count() == 1);
     // 65,535 pieces fit; one more is refused without adding anything.
     EXPECT_EQ(Split(pieces, std::string(65534, ','), ",").size(), 65534u);
     EXPECT_EQ(Split(pieces, std::string(65535, ','), ","), "refused 0");
