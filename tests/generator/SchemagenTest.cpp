@@ -44,6 +44,7 @@ struct Outcome {
   int status;
   std::string out;
   std::string err;
+  std::string Verdict() const { return std::to_string(status) + " " + err; }
 };
 
 // The generator built beside this test (build/tests/X -> build/tools/schemagen/schemagen).
@@ -69,8 +70,7 @@ TEST(Schemagen, FixtureOutputsMatchTheGoldenFiles) {
   for (const char* output : {"dump --dump", "proto --proto holder,empty"}) {
     std::string goldenPath = DataDir() + "/fixture." + std::string(output, std::strchr(output, ' '));
     Outcome run = Schemagen(fixture + std::strchr(output, ' '));
-    ASSERT_EQ(run.status, 0) << run.err;
-    EXPECT_EQ(run.err, "");
+    ASSERT_EQ(run.Verdict(), "0 ");
     if (std::getenv("SARN_UPDATE_GOLDEN") != nullptr) std::ofstream(goldenPath, std::ios::binary) << run.out;
     std::string golden;
     ASSERT_TRUE(sarntest::ReadFile(goldenPath, golden)) << "run with SARN_UPDATE_GOLDEN=1 to create " << goldenPath;
@@ -100,8 +100,7 @@ TEST(Schemagen, EveryRefusalNamesItsLine) {
     TempDir out;
     bool needsOut = entry.path().filename().string().rfind("missing-runtime", 0) == 0;
     Outcome run = Schemagen(path + (needsOut ? " --out " + out.Path() : " --check"));
-    EXPECT_EQ(run.status, 1) << path;
-    EXPECT_EQ(run.err, expected) << path;
+    EXPECT_EQ(run.Verdict(), "1 " + expected) << path;
     EXPECT_FALSE(fs::exists(out.Path() + "/schema")) << "a refused schema writes nothing";
     ++cases;
   }
@@ -116,15 +115,13 @@ TEST(Schemagen, LimitsOfTheRecordFormats) {
     return dir.Write("wide.schema", text + "end\n");
   };
   // Flag offsets have 9 bits: 488 flag bytes fit after the 24-byte header, 489 do not.
-  EXPECT_EQ(Schemagen(schema(488, "bool optional") + " --check").status, 0);
-  Outcome flags = Schemagen(schema(489, "bool optional") + " --check");
-  EXPECT_EQ(flags.status, 1);
-  EXPECT_EQ(flags.err, dir.Path() + "/wide.schema:1: type 'wide' has 489 presence flags; at most 488 fit\n");
+  EXPECT_EQ(Schemagen(schema(488, "bool optional") + " --check").Verdict(), "0 ");
+  EXPECT_EQ(Schemagen(schema(489, "bool optional") + " --check").Verdict(),
+            "1 " + dir.Path() + "/wide.schema:1: type 'wide' has 489 presence flags; at most 488 fit\n");
   // Value offsets have 16 bits: 2729 arrays of 24 bytes end at 65520, one more passes 65528.
-  EXPECT_EQ(Schemagen(schema(2729, "s32 multi") + " --check").status, 0);
-  Outcome size = Schemagen(schema(2730, "s32 multi") + " --check");
-  EXPECT_EQ(size.status, 1);
-  EXPECT_EQ(size.err, dir.Path() + "/wide.schema:1: type 'wide' needs 65544 bytes; objects are limited to 65528\n");
+  EXPECT_EQ(Schemagen(schema(2729, "s32 multi") + " --check").Verdict(), "0 ");
+  EXPECT_EQ(Schemagen(schema(2730, "s32 multi") + " --check").Verdict(),
+            "1 " + dir.Path() + "/wide.schema:1: type 'wide' needs 65544 bytes; objects are limited to 65528\n");
   // Versions are one byte; field numbers fit 16 bits with the table length.
   EXPECT_EQ(Schemagen(dir.Write("v.schema", "type a 1\n  65534 x s32 optional 0-255\nend\n") + " --check").status, 0);
   EXPECT_EQ(Schemagen(dir.Write("v.schema", "type a 65535\n  1 x s32 optional\nend\nenum e 1\n  65535 last\nend\n") +
@@ -165,7 +162,5 @@ TEST(Schemagen, CommandLine) {
   for (const std::string args : {"", " --frobnicate", " --out /tmp --units 0"}) {
     EXPECT_EQ(Schemagen(args.empty() ? args : DataDir() + "/fixture.schema" + args).status, 2) << args;
   }
-  Outcome missing = Schemagen("/nonexistent/x.schema --check");
-  EXPECT_EQ(missing.status, 1);
-  EXPECT_EQ(missing.err, "/nonexistent/x.schema: cannot read the schema description\n");
+  EXPECT_EQ(Schemagen("/nonexistent/x.schema --check").Verdict(), "1 /nonexistent/x.schema: cannot read the schema description\n");
 }

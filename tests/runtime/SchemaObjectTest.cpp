@@ -1,5 +1,4 @@
 // Generated objects: arrays of fresh objects, presence, release of what an object holds, debug lock ids.
-#include <cstring>
 #include <vector>
 
 #include "sarn/Sarn.h"
@@ -10,16 +9,7 @@ using namespace sarn;
 namespace {
 
 class SchemaObjectTest : public sarntest::PoolTest {};
-
-const FieldInfo& Field(const StructInfo* info, const char* name) {
-  unsigned n = 0;
-  while (n + 1 < info->nFieldInfo && (info->vFieldInfo[n].arity == SARN_ARITY_NONE ||
-                                      std::strcmp(FieldName(info, info->vFieldInfo[n]), name) != 0)) {
-    ++n;
-  }
-  EXPECT_STREQ(FieldName(info, info->vFieldInfo[n]), name);
-  return info->vFieldInfo[n];
-}
+const auto& Field = sarntest::FieldNamed;
 
 }  // namespace
 

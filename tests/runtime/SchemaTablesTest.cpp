@@ -47,12 +47,6 @@ std::string Fields(const StructInfo* info, const std::string& only = "") {
   return out.str();
 }
 
-unsigned FieldNumber(const StructInfo* info, const char* name) {
-  unsigned n = 0;
-  while (n < info->nFieldInfo && std::strcmp(FieldName(info, info->vFieldInfo[n]), name) != 0) ++n;
-  return n;
-}
-
 // "number=name" for each named value, then the count of numbers.
 std::string EnumValues(long id) {
   const EnumDef* def = EnumDefForId(id);
@@ -262,9 +256,8 @@ TEST(SchemaTables, EveryTypeOfTheListAndThePublishedStatistics) {
 TEST(SchemaTables, FieldSelectionByVersion) {
   // endUserMessageId: required up to 21 (the older record, no flag), optional from 22.
   const StructInfo* info = Type("endUserMessage");
-  unsigned n = FieldNumber(info, "endUserMessageId");
-  ASSERT_LT(n, info->nFieldInfo);
-  const FieldInfo* current = &info->vFieldInfo[n];
+  const FieldInfo* current = &sarntest::FieldNamed(info, "endUserMessageId");
+  unsigned n = static_cast<unsigned>(current - info->vFieldInfo);
   const FieldInfo* older = &info->vFieldInfoHistory[n].vFieldInfo[0];
   EXPECT_TRUE(older->flagOffset == 0 && current->flagOffset != 0);
   // Version 0 never consults the history; the placeholder and numbers past the end give nothing.
