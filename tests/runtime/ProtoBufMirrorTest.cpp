@@ -57,9 +57,7 @@ void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, M
   const Reflection* r = out->GetReflection();
   const bool isMulti = fd->is_repeated();
   auto put = [&](auto value, auto add, auto set) { isMulti ? (r->*add)(out, fd, value) : (r->*set)(out, fd, value); };
-  auto text = [&](const VekString& s) {
-    put(std::string(s.Utf8(), s.NByte()), &Reflection::AddString, &Reflection::SetString);
-  };
+  auto text = [&](const VekString& s) { put(sarntest::Str(s), &Reflection::AddString, &Reflection::SetString); };
   switch (field.dataType) {
     case SARN_DATA_TYPE_BOOL:
       return put(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0, &Reflection::AddBool, &Reflection::SetBool);
