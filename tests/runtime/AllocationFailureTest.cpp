@@ -134,8 +134,7 @@ const Row kRowsG[] = {
        std::string text;
        if (isOk) {
          wynbaselib::GunzipBytesource source(&compressed, pool);
-         char block[4096];
-         for (size_t n; (n = source.Read(block, sizeof block)) != 0;) text.append(block, n);
+         text = sarntest::ReadAll(source, 4096);
          isOk = !source.FError();
        }
        endOfRun();

@@ -117,11 +117,9 @@ TEST_F(DictionaryObjectTest, ScalarFailuresReplaceEarlierTextAndOthersAppend) {
   // digit follows them here) and, like the string forms, numbers only up to a NUL.
   using D = DictionarySarnObject;
   const std::string nul(1, '\0');
-  const FieldInfo* ids[3] = {};  // the first int, long and string id fields
-  for (const FieldInfo& field : sarnschema::TestAllTypes::vFieldInfoG) {
-    int k = field.dataType == SARN_DATA_TYPE_INT_ID ? 0 : field.dataType == SARN_DATA_TYPE_LONG_ID ? 1 : 2;
-    if (ids[k] == nullptr && (k != 2 || field.dataType == SARN_DATA_TYPE_STRING_ID)) ids[k] = &field;
-  }
+  const StructInfo* info = object->GetStructInfo();
+  const FieldInfo* ids[3] = {&sarntest::FieldNamed(info, "idInt"), &sarntest::FieldNamed(info, "idLong"),
+                             &sarntest::FieldNamed(info, "idString")};
   for (std::string text : std::vector<std::string>{"vask:rc.17", "vask:rc.17" + nul + "9", "vask:r", "", "vask:of.x1",
                                                   "vask:ct.tms.ep.12", "vask:rc." + std::string(70, '1'),
                                                   "vask:ct.tms.ep.1" + nul + "2"}) {

@@ -76,16 +76,13 @@ TEST(SchemaTables, AddressRecordsByteForByte) {
       {0x07, 0x2a, 0x31, 0x00, 0x50, 0x00, 0x00, 0x00, 0x36, 0x00, 0x00, 0x00},
       {0x07, 0x2a, 0x11, 0x0d, 0x58, 0x00, 0x00, 0x00, 0x3e, 0x00, 0x00, 0x00}};
   const StructInfo* info = Schema::vStructDefG[191];
-  ASSERT_EQ(info, &sarnschema::Address::structInfoG);
-  EXPECT_STREQ(info->pName, "address");
-  EXPECT_STREQ(info->pIdPrefix, "vask:ds.");
-  ASSERT_EQ(info->nFieldInfo, 9);
-  EXPECT_EQ(std::memcmp(info->vFieldInfo, kRecords, sizeof kRecords), 0);
-  EXPECT_EQ(info->pFieldNames, sarnschema::Address::pFieldNamesG);
+  ASSERT_TRUE(info == &sarnschema::Address::structInfoG && info->nFieldInfo == 9);
+  EXPECT_EQ(std::string(info->pName) + " " + info->pIdPrefix, "address vask:ds.");
+  EXPECT_TRUE(std::memcmp(info->vFieldInfo, kRecords, sizeof kRecords) == 0 && info->pFieldNames == sarnschema::Address::pFieldNamesG);
   EXPECT_EQ(std::string(info->pFieldNames, 70),
             std::string("addressId\0city\0country\0levelOfDetail\0postalCode\0state\0street1\0street2\0", 70));
   for (int i = 0; i < 9; ++i) EXPECT_EQ(info->vFieldInfoHistory[i].nFieldInfo, 0u);
-  EXPECT_EQ(sizeof(sarnschema::Address), 96u);
+  static_assert(sizeof(sarnschema::Address) == 96, "the address object's size");
   // The bit fields over the record's bytes: LONG_ID, optional, flag at byte 24.
   const FieldInfo& id = info->vFieldInfo[1];
   EXPECT_EQ(std::vector<int>({id.typeBits, id.flagOffset, id.dataType, id.arity}),
@@ -104,9 +101,8 @@ TEST(SchemaTables, ObjectLayouts) {
               std::vector<size_t>({20, 24, 25, 26, 27, 28, 28}));
     ref<SarnObject> account = sarnschema::Account::Factory(&pool);
     auto* a = static_cast<sarnschema::Account*>(account.Get());
-    EXPECT_EQ(OffsetOf(a, &a->accountIdM), 24u);
-    EXPECT_EQ(OffsetOf(a, &a->bodyIdM), 32u);
-    EXPECT_EQ(sizeof(sarnschema::Account), 56u);
+    EXPECT_EQ(std::vector<size_t>({OffsetOf(a, &a->accountIdM), OffsetOf(a, &a->bodyIdM), sizeof(sarnschema::Account)}),
+              std::vector<size_t>({24, 32, 56}));
   }
   const StructInfo* all = Type("testAllTypes");
   std::set<int> flags;
@@ -117,8 +113,7 @@ TEST(SchemaTables, ObjectLayouts) {
   }
   EXPECT_EQ(std::vector<int>({int(flags.size()), *flags.begin(), *flags.rbegin(), firstValue, all->nFieldInfo}),
             std::vector<int>({21, 24, 44, 48, 79}));
-  EXPECT_EQ(sizeof(sarnschema::TestAllTypes), 1088u);
-  EXPECT_EQ(pool.GetUsedBytes(), 0u);
+  EXPECT_TRUE(sizeof(sarnschema::TestAllTypes) == 1088 && pool.GetUsedBytes() == 0);
 }
 
 TEST(SchemaTables, RepresentativeTypesFieldForField) {
