@@ -46,19 +46,16 @@ TEST_F(ArrayTest, ArraysRefuseThe65536thElement) {
   ref<Item> item = new (&poolM) Item(0);
   VekGenericArray array(&poolM);
   for (int i = 0; i < 65535; ++i) ASSERT_TRUE(array.Add(item.Get())) << i;
-  EXPECT_FALSE(array.Add(item.Get()));
-  EXPECT_TRUE(array.Count() == 65535 && array.Get(65534) == item.Get()) << "no wrap to 0";
+  EXPECT_TRUE(!array.Add(item.Get()) && array.Count() == 65535 && array.Get(65534) == item.Get()) << "no wrap to 0";
   EXPECT_EQ(item->GetRefCount(), 65536u) << "a refused element takes no reference";
-  EXPECT_TRUE(array.RemoveAt(0));
-  EXPECT_TRUE(array.Add(item.Get())) << "room again after a removal";
+  EXPECT_TRUE(array.RemoveAt(0) && array.Add(item.Get())) << "room again after a removal";
   array.Destroy();
   EXPECT_EQ(item->GetRefCount(), 1u);
 
   VekGenericIntArray ints(8, &poolM, 0);
   for (uint64_t i = 0; i < 65535; ++i) ASSERT_TRUE(ints.Add(&i)) << i;
   uint64_t extra = 65535;
-  EXPECT_FALSE(ints.Add(&extra));
-  EXPECT_TRUE(ints.Count() == 65535 && *static_cast<uint64_t*>(ints.Get(65534)) == 65534u);
+  EXPECT_TRUE(!ints.Add(&extra) && ints.Count() == 65535 && *static_cast<uint64_t*>(ints.Get(65534)) == 65534u);
   EXPECT_EQ(poolM.GetUsedBytes(), 65535u * 8 + sizeof(Item));
 }
 

@@ -40,15 +40,13 @@ TEST_F(MempoolTest, CountsExactlyWhatCallersAskFor) {
     expected += size;
     EXPECT_EQ(poolM.GetUsedBytes(), expected);
   }
-  EXPECT_EQ(poolM.GetLiveBlocks(), blocks.size());
-  EXPECT_EQ(poolM.GetUsedBytesHighWater(), expected);
+  EXPECT_TRUE(poolM.GetLiveBlocks() == blocks.size() && poolM.GetUsedBytesHighWater() == expected);
   for (void* p : blocks) {
     expected -= VekMempool::SizeOf(p);
     poolM.Free(p);
     EXPECT_EQ(poolM.GetUsedBytes(), expected);
   }
-  EXPECT_EQ(poolM.GetLiveBlocks(), 0u);
-  EXPECT_EQ(poolM.GetUsedBytesHighWater(), 105681u) << "high water stays at the peak";
+  EXPECT_TRUE(poolM.GetLiveBlocks() == 0 && poolM.GetUsedBytesHighWater() == 105681) << "high water stays at the peak";
   poolM.Free(nullptr);
   EXPECT_EQ(VekMempool::PoolOf(nullptr), nullptr);
 }
@@ -68,9 +66,7 @@ TEST_F(MempoolTest, FreeListsRecycleAndCallocZeroes) {
   EXPECT_NE(c, z);
   poolM.Free(z);
   poolM.Free(c);
-  EXPECT_EQ(poolM.Calloc(SIZE_MAX / 2, 3), nullptr);
-  EXPECT_EQ(poolM.Malloc(SIZE_MAX - 4), nullptr);
-  EXPECT_EQ(poolM.GetLiveBlocks(), 0u);
+  EXPECT_TRUE(poolM.Calloc(SIZE_MAX / 2, 3) == nullptr && poolM.Malloc(SIZE_MAX - 4) == nullptr && poolM.GetLiveBlocks() == 0);
 }
 
 // Two threads allocate from one pool and free each other's blocks, in both directions (the
@@ -225,8 +221,7 @@ TEST_F(MempoolTest, ReallocKeepsBytesAndAccounting) {
   size_t size = 20;
   unsigned char* p = static_cast<unsigned char*>(poolM.Realloc(nullptr, size));
   for (size_t i = 0; i < size; ++i) p[i] = static_cast<unsigned char>(i * 7);
-  EXPECT_EQ(poolM.Realloc(p, 32), p) << "17..32 is one class";
-  EXPECT_EQ(poolM.GetUsedBytes(), 32u);
+  EXPECT_TRUE(poolM.Realloc(p, 32) == p && poolM.GetUsedBytes() == 32) << "17..32 is one class";
   p = static_cast<unsigned char*>(poolM.Realloc(p, size = 200));
   EXPECT_EQ(poolM.GetUsedBytesHighWater(), 232u) << "the copy briefly holds both blocks";
   for (size_t i = 20; i < size; ++i) p[i] = static_cast<unsigned char>(i * 7);
@@ -251,8 +246,7 @@ TEST_F(MempoolTest, ReallocKeepsBytesAndAccounting) {
 TEST_F(MempoolTest, MempoolNewTakesANamedArgumentOfTheNamedType) {
   ref<sarn::Dictionary> dictionary = new (&poolM) sarn::Dictionary();
   ref<sarn::Dict> dict = MempoolNew<sarn::Dict, ref<sarn::Dictionary>>(&poolM, dictionary);
-  ASSERT_TRUE(dict);
-  EXPECT_EQ(dict->GetDictionary().Get(), dictionary.Get());
+  EXPECT_TRUE(dict && dict->GetDictionary().Get() == dictionary.Get());
 }
 
 #if defined(__SANITIZE_ADDRESS__)
