@@ -31,20 +31,16 @@ TEST_F(ByteBufferTest, SingleBytesGrowByAtLeast256AndKeepASpareByte) {
 TEST_F(ByteBufferTest, RunsGrowByTheirLengthPlusAFifth) {
   sarn::ByteBuffer buffer(&poolM);
   std::string big(10000, 'x');
-  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(big.data()), big.size()));
-  EXPECT_EQ(Capacity(buffer), 10256u);
+  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(big.data()), big.size()) && Capacity(buffer) == 10256);
   std::string fill(255, 'y');
-  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(fill.data()), fill.size()));
-  EXPECT_EQ(Capacity(buffer), 10256u) << "10,255 of 10,256 bytes used leaves the spare byte";
-  ASSERT_TRUE(buffer.AppendByte('z'));
-  EXPECT_EQ(Capacity(buffer), 10256u + 1 + 2051);
+  ASSERT_TRUE(buffer.AppendBytes(reinterpret_cast<const unsigned char*>(fill.data()), fill.size()) && Capacity(buffer) == 10256)
+      << "10,255 of 10,256 bytes used leaves the spare byte";
+  ASSERT_TRUE(buffer.AppendByte('z') && Capacity(buffer) == 10256u + 1 + 2051);
   EXPECT_TRUE(buffer.AppendBytes(nullptr, 0));
 
   // Reserve grows exactly as an append of that many bytes would, and only when it must.
-  EXPECT_TRUE(buffer.Reserve(2051));
-  EXPECT_EQ(Capacity(buffer), 12308u) << "2,052 spare bytes hold 2,051 and the spare byte";
-  EXPECT_TRUE(buffer.Reserve(2052));
-  EXPECT_EQ(Capacity(buffer), 12308u + 2052 + 2461);
+  EXPECT_TRUE(buffer.Reserve(2051) && Capacity(buffer) == 12308) << "2,052 spare bytes hold 2,051 and the spare byte";
+  EXPECT_TRUE(buffer.Reserve(2052) && Capacity(buffer) == 12308u + 2052 + 2461);
   EXPECT_EQ(Contents(buffer), big + fill + "z");
   EXPECT_FALSE(buffer.Reserve(ULONG_MAX));
 }
@@ -77,8 +73,7 @@ TEST_F(ByteBufferTest, CoreDoublesForBytesAndFitsRunsExactly) {
   EXPECT_TRUE(!core->AppendBytes(run, 0x80000000ul) && core->GetLength() == 20) << "past the platform's 2 GiB";
 
   ref<sarn::Vek1ByteBufferCore> small = new (&poolM) sarn::Vek1ByteBufferCore();
-  ASSERT_TRUE(small->AppendBytes(run, 3));
-  EXPECT_EQ(small->GetCapacity(), 8u) << "at least 8 bytes";
+  EXPECT_TRUE(small->AppendBytes(run, 3) && small->GetCapacity() == 8) << "at least 8 bytes";
 }
 
 TEST_F(ByteBufferTest, CoreEqualityComparesLengthAndBytes) {

@@ -20,8 +20,7 @@ TEST_F(DictFacadeTest, RepeatedAddsFormAnArrayThatShrinksAndGoes) {
   EXPECT_TRUE(d->CountValues("a") == 3 && d->CountNames() == 1 && Str(d->GetString("a", 1)) == "2");
   d->Remove("a", 0);
   d->Remove("a", 0);
-  EXPECT_EQ(Text(d), R"({"a": ["3"]})") << "one element left stays an array";
-  EXPECT_EQ(d->GetType("a", 0), dictvalue::TYPE_STRING);
+  EXPECT_TRUE(Text(d) == R"({"a": ["3"]})" && d->GetType("a", 0) == dictvalue::TYPE_STRING) << "one element stays an array";
   d->Remove("a", 0);
   EXPECT_TRUE(d->CountValues("a") == 0 && Text(d) == "{}");
 

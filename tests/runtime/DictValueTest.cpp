@@ -76,13 +76,11 @@ TEST_F(DictValueTest, RepeatedNamesKeepEveryValueInOrder) {
   VekArray<DictValue> range(&poolM);
   range.Add(one);  // GetRange appends, it does not clear
   d->GetRange(VekString("x"), range);
-  ASSERT_EQ(range.Count(), 4);
-  EXPECT_EQ(Compact(range[3]), "\"three\"");
+  ASSERT_TRUE(range.Count() == 4 && Compact(range[3]) == "\"three\"");
   VekStringArray texts(&poolM);
   d->GetStringRange(VekString("y"), texts);
   d->GetStringRange(VekString("x"), texts);
-  ASSERT_EQ(texts.Count(), 3) << "no texts from a name without them";
-  EXPECT_EQ(Str(texts[2]), "three");
+  ASSERT_TRUE(texts.Count() == 3 && Str(texts[2]) == "three") << "no texts from a name without them";
 
   EXPECT_TRUE(d->Remove(VekString("x")) && !d->Remove(VekString("x")));
   EXPECT_TRUE(d->CountNames() == 1 && d->CountValues(VekString("x")) == 0 && Compact(d) == R"({"y": null})");

@@ -55,8 +55,7 @@ TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
   }
   std::string list = "[\"a\", [true]] tail";
   InputPointer listInput = cursor(list);
-  EXPECT_TRUE(array->FromJson(listInput, error));
-  EXPECT_EQ(Compact(array), R"(["a", [true]])");
+  EXPECT_TRUE(array->FromJson(listInput, error) && Compact(array) == R"(["a", [true]])");
 }
 
 TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
@@ -108,9 +107,8 @@ TEST_F(DictionaryJsonReaderTest, MatchesGoldenForms) {
   std::string dir = std::string(std::getenv("SARN_SOURCE_DIR") ? std::getenv("SARN_SOURCE_DIR") : ".") +
                     "/tests/data/dicts/";
   std::string input, compact, pretty;
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.json", input));
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.compact.json", compact));
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.pretty.json", pretty));
+  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.json", input) && sarntest::ReadFile(dir + "sample.compact.json", compact) &&
+              sarntest::ReadFile(dir + "sample.pretty.json", pretty));
   std::string error;
   ref<Dictionary> tree = Read(&poolM, input, &error);
   ASSERT_TRUE(tree) << error;

@@ -110,8 +110,8 @@ TEST_F(DictionaryObjectTest, ScalarFailuresReplaceEarlierTextAndOthersAppend) {
   noTarget.refIndex = 0;
   unsigned int id = 99;
   VekString error;
-  EXPECT_FALSE(DictionarySarnObject::StringToIntId(&poolM, &noTarget, VekString("vask:rc.5"), error, id));
-  EXPECT_EQ(Str(error) + " " + std::to_string(id), "no struct for idbad prefix: vask:rc.5 99");
+  EXPECT_TRUE(!DictionarySarnObject::StringToIntId(&poolM, &noTarget, VekString("vask:rc.5"), error, id) &&
+              Str(error) + " " + std::to_string(id) == "no struct for idbad prefix: vask:rc.5 99") << Str(error);
 
   // The byte forms give the string forms' values and messages, reading only their n bytes (a
   // digit follows them here) and, like the string forms, numbers only up to a NUL.
