@@ -36,8 +36,8 @@ TEST_F(JsonParserCorpusTest, EveryFileGetsTheVerdictOfItsName) {
     size_t first = text.find_first_not_of(" \t\r\n");
     bool isObject = first != std::string::npos && text[first] == '{';
     EXPECT_EQ(isOk, isSyntaxOk && isObject) << name << ": " << error;
-    EXPECT_EQ(error, isOk ? "" : isSyntaxOk ? "The JSON must start with a '{' character" : error) << name;
-    EXPECT_TRUE(isOk || error != "") << name;
+    EXPECT_EQ(error, isOk ? "" : isSyntaxOk ? "The JSON must start with a '{' character" : error == "" ? "a message" : error)
+        << name;
     EXPECT_TRUE(Read(&poolM, text, &handError) || !handError.empty()) << name;
   }
   EXPECT_GT(nFiles, 300);

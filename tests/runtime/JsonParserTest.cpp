@@ -26,11 +26,9 @@ std::string Kinds(const ref<ArrayValue>& array) {
 TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberTextAndReportsRefusals) {
   std::string error;
   ref<Dictionary> tree = Parse(&poolM, R"({"k": 1, "k": -0.5E-7, "k": {"k": []}})", &error);
-  ASSERT_TRUE(tree) << error;
-  EXPECT_EQ(Compact(tree), R"({"k": 1, "k": "-0.5E-7", "k": {"k": []}})");
+  EXPECT_EQ(Compact(tree), R"({"k": 1, "k": "-0.5E-7", "k": {"k": []}})") << error;
   tree = Parse(&poolM, R"({"a": [1, "x", null, true], "b": {"c": "\u00e9\n", "d": 1.50e+3}})", &error);
-  ASSERT_TRUE(tree) << error;
-  EXPECT_EQ(Compact(tree), "{\"a\": [1, \"x\", null, true], \"b\": {\"c\": \"\xC3\xA9\\n\", \"d\": \"1.50e+3\"}}");
+  ASSERT_EQ(Compact(tree), "{\"a\": [1, \"x\", null, true], \"b\": {\"c\": \"\xC3\xA9\\n\", \"d\": \"1.50e+3\"}}") << error;
   EXPECT_EQ(Kinds(tree->GetArray(VekString("a"))), "bqnb");
   bool isOk;
   for (const char* input : {"[1,2]", "42", "\"s\"", "null"}) {
@@ -39,8 +37,7 @@ TEST_F(JsonParserTest, KeepsRepeatedKeysAndNumberTextAndReportsRefusals) {
   }
   // yajl's own words for syntax errors; the tree built so far is kept for the caller.
   ref<Dictionary> partial = Parse(&poolM, {std::string_view(R"({"a":1,})")}, &isOk, &error);
-  EXPECT_FALSE(isOk);
-  EXPECT_EQ(error + Compact(partial), "parse error: invalid object key (must be a string)\n{\"a\": 1}");
+  EXPECT_EQ(error + Compact(partial) + (isOk ? " ok" : ""), "parse error: invalid object key (must be a string)\n{\"a\": 1}");
   for (const char* input : {"", "{\"a\"", "{a:1}", "{\"a\":tru}", "{\"a\":\"\xFF\"}", "{} {}", "{\"a\":1,}"}) {
     EXPECT_FALSE(Parse(&poolM, input, &error)) << input;
     EXPECT_TRUE(error != "" && error != "The JSON must start with a '{' character") << input;
@@ -70,8 +67,7 @@ TEST_F(JsonParserTest, SyntaxOnlyParseBuildsNothingAndBothModesBoundTheDepth) {
   std::string error;
   bool isOk;
   ref<Dictionary> partial = Parse(&poolM, {Nested(JsonLimits::kDefaultMaxDepth + 1)}, &isOk, &error);
-  EXPECT_TRUE(!isOk && partial);
-  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 512 levels.");
+  EXPECT_TRUE(!isOk && partial && error == "JSON nesting exceeds the depth limit of 512 levels.") << error;
   EXPECT_FALSE(Parse(&poolM, R"({"a": {"b": {}}})", &error, JsonLimits(2)));
   EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 2 levels.");
   EXPECT_TRUE(Parse(&poolM, R"({"a": {"b": 1}, "c": []})", &error, JsonLimits(2)));
@@ -132,8 +128,8 @@ TEST_F(JsonParserTest, EndingFollowsItsContract) {
   {
     JsonParser parser(&poolM);
     parser.BeginParse(result);
-    EXPECT_EQ(parser.GetState(), JsonParser::StateNone);
-    EXPECT_TRUE(parser.ParseChunk("{\"a\": [", 7) && parser.GetState() == JsonParser::StateArray);
+    EXPECT_TRUE(parser.GetState() == JsonParser::StateNone && parser.ParseChunk("{\"a\": [", 7) &&
+                parser.GetState() == JsonParser::StateArray);
   }
   EXPECT_EQ(Compact(result), R"({"a": []})");
   JsonParser parser(&poolM);

@@ -39,9 +39,9 @@ TEST(SarnUtilTest, EnumNamesAndNumbers) {
       {714, "huge", 99}, {-1, "cable", 99}, {sarn::Schema::nEnumDefG, "cable", 99}};
   for (const auto& [id, name, expected] : lookups) {
     unsigned int number = 99, viaText = 99;
-    EXPECT_EQ(sarn::EnumNameNumber(id, name, number), expected != 99) << name;
-    EXPECT_EQ(SarnUtil::EnumNameToNumber(static_cast<int>(id), VekString(name), viaText), expected != 99) << name;
-    EXPECT_EQ(std::vector<unsigned>({number, viaText}), std::vector<unsigned>({expected, expected})) << name;
+    bool isFound = sarn::EnumNameNumber(id, name, number);
+    EXPECT_EQ(std::vector<unsigned>({isFound, SarnUtil::EnumNameToNumber(static_cast<int>(id), VekString(name), viaText), number, viaText}),
+              std::vector<unsigned>({expected != 99, expected != 99, expected, expected})) << name;
   }
   // Unused numbers of an enum never match and have no name.
   for (int id = 0; id < sarn::Schema::nEnumDefG; ++id) {
