@@ -95,8 +95,7 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
   EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three) && !Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
   EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 3 levels. Failed to parse value for key b "
                    "Failed to parse an array member. Failed to parse value for key a");
-  EXPECT_FALSE(Read(&poolM, "{}", &error, JsonLimits(0)));
-  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 0 levels.");
+  EXPECT_EQ(ReaderVerdict(Read(&poolM, "{}", &error, JsonLimits(0)), error), "JSON nesting exceeds the depth limit of 0 levels.");
 
   // Deep input far past the limit is refused without descending into it.
   EXPECT_FALSE(Read(&poolM, std::string(1, '{') + "a:" + std::string(1000000, '['), &error));
