@@ -82,19 +82,14 @@ TEST(Schemagen, FixtureOutputsMatchTheGoldenFiles) {
 TEST(Schemagen, EveryRefusalNamesItsLine) {
   int cases = 0;
   for (const auto& entry : fs::directory_iterator(DataDir() + "/refusals")) {
-    std::string path = entry.path().string();
-    std::string text;
+    std::string path = entry.path().string(), text, expected, line;
     ASSERT_TRUE(sarntest::ReadFile(path, text));
     // "# expect N: message" (or "# expect -: message" for a problem of the whole file).
-    std::string expected;
-    std::istringstream lines(text);
-    std::string line;
-    while (std::getline(lines, line)) {
+    for (std::istringstream lines(text); std::getline(lines, line);) {
       if (line.rfind("# expect ", 0) != 0) continue;
-      std::string rest = line.substr(9);
-      size_t colon = rest.find(": ");
-      std::string where = rest.substr(0, colon);
-      expected += path + (where == "-" ? "" : ":" + where) + ": " + rest.substr(colon + 2) + "\n";
+      size_t colon = line.find(": ", 9);
+      std::string where = line.substr(9, colon - 9);
+      expected += path + (where == "-" ? "" : ":" + where) + ": " + line.substr(colon + 2) + "\n";
     }
     ASSERT_FALSE(expected.empty()) << path << " has no expectation";
     TempDir out;

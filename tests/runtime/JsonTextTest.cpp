@@ -35,13 +35,8 @@ TEST(JsonWriteTest, LongTextsAndSinkFailures) {
   std::string text;
   for (int i = 0; i < 3000; ++i) text += (i % 7 == 0) ? "\"q\"\n" : "plain text ";
   std::string expected = "\"";
-  for (char c : text) {
-    if (c == '"') expected += "\\\"";
-    else if (c == '\n') expected += "\\n";
-    else expected += c;
-  }
-  expected += "\"";
-  EXPECT_EQ(ToJson(text, true), expected);
+  for (char c : text) expected += c == '"' ? "\\\"" : c == '\n' ? "\\n" : std::string(1, c);
+  EXPECT_EQ(ToJson(text, true), expected + "\"");
 
   StringSink failing;
   failing.fFailM = true;

@@ -119,10 +119,9 @@ TEST(SchemaTables, ObjectLayouts) {
 TEST(SchemaTables, RepresentativeTypesFieldForField) {
   std::string text;
   ASSERT_TRUE(sarntest::ReadFile(std::string(getenv("SARN_SOURCE_DIR")) + "/tests/data/generator/fields.txt", text));
-  std::istringstream in(text + "\n== end\n");
   std::string line, section, expected;
   int sections = 0;
-  while (std::getline(in, line)) {
+  for (std::istringstream in(text + "\n== end\n"); std::getline(in, line);) {
     if (line.rfind("== ", 0) == 0) {
       size_t dot = section.find('.');
       if (section.rfind("enum ", 0) == 0) {
@@ -151,7 +150,6 @@ TEST(SchemaTables, EveryTypeOfTheListAndThePublishedStatistics) {
   static const unsigned char kPlaceholder[12] = {0, 0, 0x75, 0, 0, 0, 0, 0, 0, 0, 0, 0};
   std::string text, line;
   ASSERT_TRUE(sarntest::ReadFile(std::string(getenv("SARN_SOURCE_DIR")) + "/tests/data/generator/default-types.txt", text));
-  std::istringstream in(text);
   int count = 0, worst = 0, filled = 0, slots = 0, records = 0, placeholders = 0, largest = 0, alphabetical = 0,
       olderFields = 0;
   std::string largestName;
@@ -159,7 +157,7 @@ TEST(SchemaTables, EveryTypeOfTheListAndThePublishedStatistics) {
   const EnumDef* typeNames = EnumDefForId(1361);
   ASSERT_NE(typeNames, nullptr);
   EXPECT_EQ(typeNames->nValue, 5934u);
-  while (std::getline(in, line)) {
+  for (std::istringstream in(text); std::getline(in, line);) {
     if (line.empty() || line[0] == '#') continue;
     std::istringstream words(line);
     int id;
