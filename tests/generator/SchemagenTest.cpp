@@ -21,60 +21,46 @@ namespace fs = std::filesystem;
 
 namespace {
 
-std::string SourceDir() {
-  const char* dir = std::getenv("SARN_SOURCE_DIR");
-  return dir != nullptr ? dir : ".";  // ctest sets it
-}
+std::string SourceDir() { return std::getenv("SARN_SOURCE_DIR") != nullptr ? std::getenv("SARN_SOURCE_DIR") : "."; }
 
 std::string DataDir() { return SourceDir() + "/tests/data/generator"; }
 
-// The generator built beside this test (build/tests/X -> build/tools/schemagen/schemagen).
-std::string Tool() { return (fs::read_symlink("/proc/self/exe").parent_path().parent_path() / "tools/schemagen/schemagen").string(); }
-
-struct Outcome {
-  int status;
-  std::string out;
-  std::string err;
-};
-
-Outcome Schemagen(const std::string& args) {
-  static int counter = 0;
-  std::string errFile = (fs::temp_directory_path() / ("schemagen-err-" + std::to_string(getpid()) + "-" +
-                                                      std::to_string(counter++))).string();
-  std::string command = Tool() + " " + args + " 2>" + errFile;
-  Outcome run{-1, "", ""};
-  FILE* pipe = popen(command.c_str(), "r");
-  if (pipe == nullptr) return run;
-  char buffer[4096];
-  size_t n;
-  while ((n = fread(buffer, 1, sizeof buffer, pipe)) > 0) run.out.append(buffer, n);
-  int status = pclose(pipe);
-  run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  sarntest::ReadFile(errFile, run.err);
-  fs::remove(errFile);
-  return run;
-}
-
-class TempDir {
- public:
-  TempDir() {
-    std::string pattern = (fs::temp_directory_path() / "schemagen-XXXXXX").string();
-    pathM = mkdtemp(pattern.data()) != nullptr ? pattern : "";
-  }
+// A folder of its own for one test, removed with it.
+struct TempDir {
+  std::string pathM = (fs::temp_directory_path() / "schemagen-XXXXXX").string();
+  TempDir() { pathM = mkdtemp(pathM.data()) != nullptr ? pathM : ""; }
   ~TempDir() {
     std::error_code ec;
     fs::remove_all(pathM, ec);
   }
   const std::string& Path() const { return pathM; }
   std::string Write(const std::string& name, const std::string& text) const {
-    std::string path = pathM + "/" + name;
-    std::ofstream(path, std::ios::binary) << text;
-    return path;
+    std::ofstream(pathM + "/" + name, std::ios::binary) << text;
+    return pathM + "/" + name;
   }
-
- private:
-  std::string pathM;
 };
+
+struct Outcome {
+  int status;
+  std::string out;
+  std::string err;
+  std::string Verdict() const { return std::to_string(status) + " " + err; }
+};
+
+// The generator built beside this test (build/tests/X -> build/tools/schemagen/schemagen).
+Outcome Schemagen(const std::string& args) {
+  TempDir dir;
+  std::string tool = (fs::read_symlink("/proc/self/exe").parent_path().parent_path() / "tools/schemagen/schemagen").string();
+  FILE* pipe = popen((tool + " " + args + " 2>" + dir.Path() + "/err").c_str(), "r");
+  Outcome run{-1, "", ""};
+  if (pipe == nullptr) return run;
+  char buffer[4096];
+  for (size_t n; (n = fread(buffer, 1, sizeof buffer, pipe)) > 0;) run.out.append(buffer, n);
+  int status = pclose(pipe);
+  run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  sarntest::ReadFile(dir.Path() + "/err", run.err);
+  return run;
+}
 
 }  // namespace
 
@@ -84,8 +70,7 @@ TEST(Schemagen, FixtureOutputsMatchTheGoldenFiles) {
   for (const char* output : {"dump --dump", "proto --proto holder,empty"}) {
     std::string goldenPath = DataDir() + "/fixture." + std::string(output, std::strchr(output, ' '));
     Outcome run = Schemagen(fixture + std::strchr(output, ' '));
-    ASSERT_EQ(run.status, 0) << run.err;
-    EXPECT_EQ(run.err, "");
+    ASSERT_EQ(run.Verdict(), "0 ");
     if (std::getenv("SARN_UPDATE_GOLDEN") != nullptr) std::ofstream(goldenPath, std::ios::binary) << run.out;
     std::string golden;
     ASSERT_TRUE(sarntest::ReadFile(goldenPath, golden)) << "run with SARN_UPDATE_GOLDEN=1 to create " << goldenPath;
@@ -97,26 +82,20 @@ TEST(Schemagen, FixtureOutputsMatchTheGoldenFiles) {
 TEST(Schemagen, EveryRefusalNamesItsLine) {
   int cases = 0;
   for (const auto& entry : fs::directory_iterator(DataDir() + "/refusals")) {
-    std::string path = entry.path().string();
-    std::string text;
+    std::string path = entry.path().string(), text, expected, line;
     ASSERT_TRUE(sarntest::ReadFile(path, text));
     // "# expect N: message" (or "# expect -: message" for a problem of the whole file).
-    std::string expected;
-    std::istringstream lines(text);
-    std::string line;
-    while (std::getline(lines, line)) {
+    for (std::istringstream lines(text); std::getline(lines, line);) {
       if (line.rfind("# expect ", 0) != 0) continue;
-      std::string rest = line.substr(9);
-      size_t colon = rest.find(": ");
-      std::string where = rest.substr(0, colon);
-      expected += path + (where == "-" ? "" : ":" + where) + ": " + rest.substr(colon + 2) + "\n";
+      size_t colon = line.find(": ", 9);
+      std::string where = line.substr(9, colon - 9);
+      expected += path + (where == "-" ? "" : ":" + where) + ": " + line.substr(colon + 2) + "\n";
     }
     ASSERT_FALSE(expected.empty()) << path << " has no expectation";
     TempDir out;
     bool needsOut = entry.path().filename().string().rfind("missing-runtime", 0) == 0;
     Outcome run = Schemagen(path + (needsOut ? " --out " + out.Path() : " --check"));
-    EXPECT_EQ(run.status, 1) << path;
-    EXPECT_EQ(run.err, expected) << path;
+    EXPECT_EQ(run.Verdict(), "1 " + expected) << path;
     EXPECT_FALSE(fs::exists(out.Path() + "/schema")) << "a refused schema writes nothing";
     ++cases;
   }
@@ -131,15 +110,13 @@ TEST(Schemagen, LimitsOfTheRecordFormats) {
     return dir.Write("wide.schema", text + "end\n");
   };
   // Flag offsets have 9 bits: 488 flag bytes fit after the 24-byte header, 489 do not.
-  EXPECT_EQ(Schemagen(schema(488, "bool optional") + " --check").status, 0);
-  Outcome flags = Schemagen(schema(489, "bool optional") + " --check");
-  EXPECT_EQ(flags.status, 1);
-  EXPECT_EQ(flags.err, dir.Path() + "/wide.schema:1: type 'wide' has 489 presence flags; at most 488 fit\n");
+  EXPECT_EQ(Schemagen(schema(488, "bool optional") + " --check").Verdict(), "0 ");
+  EXPECT_EQ(Schemagen(schema(489, "bool optional") + " --check").Verdict(),
+            "1 " + dir.Path() + "/wide.schema:1: type 'wide' has 489 presence flags; at most 488 fit\n");
   // Value offsets have 16 bits: 2729 arrays of 24 bytes end at 65520, one more passes 65528.
-  EXPECT_EQ(Schemagen(schema(2729, "s32 multi") + " --check").status, 0);
-  Outcome size = Schemagen(schema(2730, "s32 multi") + " --check");
-  EXPECT_EQ(size.status, 1);
-  EXPECT_EQ(size.err, dir.Path() + "/wide.schema:1: type 'wide' needs 65544 bytes; objects are limited to 65528\n");
+  EXPECT_EQ(Schemagen(schema(2729, "s32 multi") + " --check").Verdict(), "0 ");
+  EXPECT_EQ(Schemagen(schema(2730, "s32 multi") + " --check").Verdict(),
+            "1 " + dir.Path() + "/wide.schema:1: type 'wide' needs 65544 bytes; objects are limited to 65528\n");
   // Versions are one byte; field numbers fit 16 bits with the table length.
   EXPECT_EQ(Schemagen(dir.Write("v.schema", "type a 1\n  65534 x s32 optional 0-255\nend\n") + " --check").status, 0);
   EXPECT_EQ(Schemagen(dir.Write("v.schema", "type a 65535\n  1 x s32 optional\nend\nenum e 1\n  65535 last\nend\n") +
@@ -150,15 +127,14 @@ TEST(Schemagen, LimitsOfTheRecordFormats) {
 TEST(Schemagen, OutputIsDeterministicAndRewritesNothingUnchanged) {
   std::string user = SourceDir() + "/tests/generator/userschema/user.schema";
   TempDir first, second;
-  ASSERT_EQ(Schemagen(user + " --out " + first.Path() + " --units 3").status, 0);
-  ASSERT_EQ(Schemagen(user + " --out " + second.Path() + " --units 3 --stamp " + second.Path() + "/stamp").status, 0);
+  ASSERT_TRUE(Schemagen(user + " --out " + first.Path() + " --units 3").status == 0 &&
+              Schemagen(user + " --out " + second.Path() + " --units 3 --stamp " + second.Path() + "/stamp").status == 0);
   std::vector<std::string> names;
   for (const auto& entry : fs::directory_iterator(first.Path() + "/schema")) {
     std::string name = entry.path().filename().string();
     names.push_back(name);
     std::string a, b;
-    ASSERT_TRUE(sarntest::ReadFile(entry.path().string(), a));
-    ASSERT_TRUE(sarntest::ReadFile(second.Path() + "/schema/" + name, b)) << name;
+    ASSERT_TRUE(sarntest::ReadFile(entry.path().string(), a) && sarntest::ReadFile(second.Path() + "/schema/" + name, b));
     EXPECT_EQ(a, b) << name;
     EXPECT_EQ(a.rfind("// generated: do not edit", 0), 0u) << name;
   }
@@ -177,10 +153,8 @@ TEST(Schemagen, OutputIsDeterministicAndRewritesNothingUnchanged) {
 }
 
 TEST(Schemagen, CommandLine) {
-  EXPECT_EQ(Schemagen("").status, 2);
-  EXPECT_EQ(Schemagen(DataDir() + "/fixture.schema --frobnicate").status, 2);
-  EXPECT_EQ(Schemagen(DataDir() + "/fixture.schema --out /tmp --units 0").status, 2);
-  Outcome missing = Schemagen("/nonexistent/x.schema --check");
-  EXPECT_EQ(missing.status, 1);
-  EXPECT_EQ(missing.err, "/nonexistent/x.schema: cannot read the schema description\n");
+  for (const std::string args : {"", " --frobnicate", " --out /tmp --units 0"}) {
+    EXPECT_EQ(Schemagen(args.empty() ? args : DataDir() + "/fixture.schema" + args).status, 2) << args;
+  }
+  EXPECT_EQ(Schemagen("/nonexistent/x.schema --check").Verdict(), "1 /nonexistent/x.schema: cannot read the schema description\n");
 }

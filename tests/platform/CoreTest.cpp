@@ -37,9 +37,7 @@ class CoreTest : public sarntest::PoolTest {
 
 TEST_F(CoreTest, CountedNewStartsAtZeroAndLastReferenceFreesIntoThePool) {
   Leaf* raw = new (&poolM) Leaf(7);
-  EXPECT_EQ(raw->GetRefCount(), 0u);
-  EXPECT_EQ(raw->GetMempool(), &poolM);
-  EXPECT_EQ(poolM.GetUsedBytes(), sizeof(Leaf));
+  EXPECT_TRUE(raw->GetRefCount() == 0 && raw->GetMempool() == &poolM && poolM.GetUsedBytes() == sizeof(Leaf));
   {
     ref<Leaf> first = raw;
     EXPECT_EQ(raw->GetRefCount(), 1u);
@@ -53,8 +51,7 @@ TEST_F(CoreTest, CountedNewStartsAtZeroAndLastReferenceFreesIntoThePool) {
     first = alias;  // self-assignment keeps the object alive
     EXPECT_EQ(raw->GetRefCount(), 3u);
   }
-  EXPECT_EQ(destroyedG, 1);
-  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+  EXPECT_TRUE(destroyedG == 1 && poolM.GetUsedBytes() == 0);
 
   const ref<Leaf> p = MempoolNew<Leaf>(&poolM, 3);
   p->Set(4);  // a const ref still gives a mutable object
@@ -79,9 +76,8 @@ TEST_F(CoreTest, EachObjectKeepsItsOwnPoolWhenNewsNest) {
   VekMempool other("other");
   {
     ref<Branch> branch = new (&poolM) Branch(new (&other) Leaf(2));
-    EXPECT_TRUE(branch->GetMempool() == &poolM && branch->childM->GetMempool() == &other);
-    EXPECT_EQ(poolM.GetUsedBytes(), sizeof(Branch));
-    EXPECT_EQ(other.GetUsedBytes(), sizeof(Leaf));
+    EXPECT_TRUE(branch->GetMempool() == &poolM && branch->childM->GetMempool() == &other &&
+                poolM.GetUsedBytes() == sizeof(Branch) && other.GetUsedBytes() == sizeof(Leaf));
   }
   EXPECT_EQ(other.GetUsedBytes(), 0u);
   // An object not made with the counted new belongs to the default pool.
@@ -114,8 +110,7 @@ TEST_F(CoreTest, ConcurrentUpAndDownRefsAreExact) {
   std::thread a(hammer), b(hammer);
   a.join();
   b.join();
-  EXPECT_EQ(shared->GetRefCount(), 1u);
-  EXPECT_EQ(destroyedG, 0);
+  EXPECT_TRUE(shared->GetRefCount() == 1 && destroyedG == 0);
 
   // Many objects, each released by both threads at once.
   constexpr int kObjects = 20000;
@@ -150,8 +145,7 @@ TEST(CoreLayoutTest, DerivedFirst32BitMemberSitsAtByte20) {
   };
   Derived d;
   const char* base = reinterpret_cast<const char*>(&d);
-  EXPECT_EQ(reinterpret_cast<const char*>(&d.firstM) - base, 20);
-  EXPECT_EQ(reinterpret_cast<const char*>(&d.secondM) - base, 24);
+  EXPECT_TRUE(reinterpret_cast<const char*>(&d.firstM) - base == 20 && reinterpret_cast<const char*>(&d.secondM) - base == 24);
   EXPECT_EQ(d.ZoCastHelper(&d), nullptr) << "an unknown class key is no match";
 }
 

@@ -3,6 +3,7 @@
 #include <cstdlib>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include "testutil/TestUtil.h"
@@ -52,10 +53,10 @@ TEST(FeaturesDeathTest, Feature548FollowsTheEnvironment) {
     if (isSetOff) VekFeatures::SetEnabled(548, false);  // an explicit setting wins over the environment
     std::exit((VekFeatures::FEnabled(548) ? 1 : 0) + (VekFeatures::FEnabled(547) ? 2 : 0));
   };
-  EXPECT_EXIT(exitWithFeature("1", false), testing::ExitedWithCode(1), "");
-  EXPECT_EXIT(exitWithFeature("0", false), testing::ExitedWithCode(0), "");
-  EXPECT_EXIT(exitWithFeature("yes", false), testing::ExitedWithCode(0), "");
-  EXPECT_EXIT(exitWithFeature("1", true), testing::ExitedWithCode(0), "");
+  const std::tuple<const char*, bool, int> cases[] = {{"1", false, 1}, {"0", false, 0}, {"yes", false, 0}, {"1", true, 0}};
+  for (const auto& [value, isSetOff, code] : cases) {
+    EXPECT_EXIT(exitWithFeature(value, isSetOff), testing::ExitedWithCode(code), "") << value << isSetOff;
+  }
 }
 
 TEST(SpinLockTest, ExcludesAcrossThreads) {
@@ -68,10 +69,8 @@ TEST(SpinLockTest, ExcludesAcrossThreads) {
       ++counter;
     }
   };
-  std::thread a(add), b(add), c(add);
-  a.join();
-  b.join();
-  c.join();
+  std::thread threads[] = {std::thread(add), std::thread(add), std::thread(add)};
+  for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(counter, 600000);
   ASSERT_TRUE(lock.TryLock());
   EXPECT_FALSE(lock.TryLock()) << "not recursive";

@@ -22,7 +22,7 @@ constexpr unsigned kTestAllTypes = 1259;
 std::string CompactJson(const DictValue& value) {
   ByteBuffer out(value.GetMempool());
   value.ToJson(out, JsonFormat(false));
-  return std::string(reinterpret_cast<const char*>(out.GetData()), out.GetLength());
+  return sarntest::Contents(out);
 }
 
 std::string ObjectJson(const SarnObject* object) {
@@ -112,8 +112,7 @@ const Row kRowsG[] = {
        ByteBuffer out(pool);
        in.dictionaryM->ToJson(out, JsonFormat(false));
        endOfRun();
-       if (out.HasFailed()) return Outcome{false, "failed"};
-       return Outcome{true, std::string(reinterpret_cast<const char*>(out.GetData()), out.GetLength())};
+       return out.HasFailed() ? Outcome{false, "failed"} : Outcome{true, sarntest::Contents(out)};
      }},
     {"protocol-buffer reader", "false",
      [](VekMempool* pool, const Inputs& in, const std::function<void()>& endOfRun) {
@@ -135,8 +134,7 @@ const Row kRowsG[] = {
        std::string text;
        if (isOk) {
          wynbaselib::GunzipBytesource source(&compressed, pool);
-         char block[4096];
-         for (size_t n; (n = source.Read(block, sizeof block)) != 0;) text.append(block, n);
+         text = sarntest::ReadAll(source, 4096);
          isOk = !source.FError();
        }
        endOfRun();

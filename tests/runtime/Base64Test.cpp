@@ -22,8 +22,7 @@ class Base64Pool : public Base64Test {
     ref<vek::ByteBuffer> viaText = sarn::DecodeBase64(&poolM, Text(text));
     EXPECT_TRUE(viaText) << "DecodeBase64 never gives null";
     if (!fOk) {
-      EXPECT_EQ(Str(out), "old") << "a failed decode leaves the output alone";
-      EXPECT_EQ(viaText->GetLength(), 0u);
+      EXPECT_TRUE(Str(out) == "old" && viaText->GetLength() == 0) << "a failed decode leaves the output alone";
       return "<fail>";
     }
     EXPECT_EQ(Str(viaText), Str(out));
@@ -44,21 +43,14 @@ TEST_F(Base64Pool, EncodesWithPaddingAndBothCodeSets) {
   ref<vek::ByteBuffer> text, back;
   other.Encode(&poolM, Bytes("\xFB\xFF"), text);
   EXPECT_EQ(Str(text), "._8-");
-  ASSERT_TRUE(other.Decode(&poolM, text, back));
-  EXPECT_EQ(Str(back), "\xFB\xFF");
+  EXPECT_TRUE(other.Decode(&poolM, text, back) && Str(back) == "\xFB\xFF");
   EXPECT_FALSE(other.Decode(&poolM, Bytes("+/8="), back)) << "the other code set's characters";
   other.Encode(&poolM, ref<vek::ByteBuffer>(), text);
   EXPECT_EQ(text->GetLength(), 0u);
 }
 
 TEST_F(Base64Pool, DecodeAcceptsPaddingOnlyAtTheEnd) {
-  // The character after padding is not examined; unused low bits are ignored.
-  const std::pair<std::string, const char*> cases[] = {
-      {"Zm9v", "foo"}, {"Zm8=", "fo"}, {"Zg==", "f"}, {"", ""}, {"Zg=x", "f"}, {"Zm8=Zg==", "<fail>"},
-      {"Zg==Zm9v", "<fail>"}, {"Zm9", "<fail>"}, {"Z!==", "<fail>"}, {"Z===", "<fail>"}, {"====", "<fail>"},
-      {"Zm9vZm8x", "foofo1"}, {"Zm9vZ!8x", "<fail>"}, {"Zm9vZm8", "<fail>"}, {std::string("Zm\0v", 4), "<fail>"},
-      {"Zh==", "f"}, {"Zm9=x", "<fail>"}};
-  for (const auto& [text, bytes] : cases) EXPECT_EQ(Decode(text), bytes) << text;
+  for (const auto& row : sarntest::ReadTable("values/base64-decode.txt", 2)) EXPECT_EQ(Decode(row[0]), row[1]) << row[0];
 }
 
 TEST_F(Base64Pool, BadCodeSetsAreRejected) {
@@ -68,17 +60,13 @@ TEST_F(Base64Pool, BadCodeSetsAreRejected) {
   withTerminator[10] = '=';
   for (const char* codeSet : {repeated.c_str(), withTerminator.c_str(), "ABC", "", static_cast<const char*>(nullptr)}) {
     sarn::Base64 codec(codeSet, '=');
-    EXPECT_TRUE(codec.fBadCodeSetM);
-    ref<vek::ByteBuffer> out = Bytes("old");
+    ref<vek::ByteBuffer> out = Bytes("old"), kept = Bytes("old");
     codec.Encode(&poolM, Bytes("foo"), out);
-    EXPECT_EQ(out->GetLength(), 0u);
-    out = Bytes("old");
-    EXPECT_FALSE(codec.Decode(&poolM, Bytes("Zm9v"), out));
-    EXPECT_EQ(Str(out), "old");
+    EXPECT_TRUE(codec.fBadCodeSetM && out->GetLength() == 0);
+    EXPECT_TRUE(!codec.Decode(&poolM, Bytes("Zm9v"), kept) && Str(kept) == "old");
   }
   // A NUL terminator makes the string's own end count as the terminator.
-  EXPECT_FALSE(sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, 0).fBadCodeSetM);
-  EXPECT_TRUE(sarn::Base64("ABC", 0).fBadCodeSetM);
+  EXPECT_TRUE(!sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, 0).fBadCodeSetM && sarn::Base64("ABC", 0).fBadCodeSetM);
 }
 
 TEST_F(Base64Pool, LargeRoundTripAllocatesOnlyTheResult) {
@@ -88,13 +76,10 @@ TEST_F(Base64Pool, LargeRoundTripAllocatesOnlyTheResult) {
   size_t before = poolM.GetUsedBytes();
   ref<vek::ByteBuffer> text;
   sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, '=').Encode(&poolM, input, text);
-  EXPECT_EQ(text->GetLength(), 133336u);
-  EXPECT_EQ(text->GetCapacity(), 133336u);
+  EXPECT_TRUE(text->GetLength() == 133336 && text->GetCapacity() == 133336);
   ref<vek::ByteBuffer> back;
   ASSERT_TRUE(sarn::Base64(sarn::Base64::DEFAULT_CODE_SET, '=').Decode(&poolM, text, back));
-  EXPECT_EQ(Str(back), bytes);
-  EXPECT_LE(back->GetCapacity(), bytes.size() + 2);
-  EXPECT_GT(poolM.GetUsedBytes(), before);
+  EXPECT_TRUE(Str(back) == bytes && back->GetCapacity() <= bytes.size() + 2 && poolM.GetUsedBytes() > before);
   text.Reset();
   back.Reset();
   EXPECT_EQ(poolM.GetUsedBytes(), before);

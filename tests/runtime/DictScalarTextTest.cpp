@@ -88,14 +88,13 @@ TEST(DictParseTest, Integers) {
     }
     EXPECT_EQ(value, row[2]) << row[0] << " " << row[1];
   }
-  EXPECT_EQ(Dict::ParseU64(nullptr, nullptr), 0u);
-  EXPECT_EQ(Dict::ParseU32(nullptr, "4294967295"), 4294967295u);
-  EXPECT_EQ(Dict::ParseU32(nullptr, "4294967296"), 0u);
+  EXPECT_EQ(std::vector<unsigned long long>({Dict::ParseU64(nullptr, nullptr), Dict::ParseU32(nullptr, "4294967295"),
+                                              Dict::ParseU32(nullptr, "4294967296")}),
+            std::vector<unsigned long long>({0, 4294967295u, 0}));
 }
 
 TEST(DictParseTest, BooleansFloatsAndBytestrings) {
-  EXPECT_TRUE(Dict::ParseBool(nullptr, Text("true")));
-  EXPECT_TRUE(Dict::ParseBool(nullptr, Text(std::string("true\0x", 6))));
+  EXPECT_TRUE(Dict::ParseBool(nullptr, Text("true")) && Dict::ParseBool(nullptr, Text(std::string("true\0x", 6))));
   for (const char* other : {"TRUE", "True", "false", "1", "", "true "}) EXPECT_FALSE(Dict::ParseBool(nullptr, Text(other)));
   for (const auto& [text, value] : std::vector<std::pair<std::string, double>>{
            {"1.5", 1.5}, {" -2e3x", -2000.0}, {"abc", 0.0}, {"", 0.0}, {Str(Dict::FormatFloat(nullptr, 0.1)), 0.1}}) {
@@ -104,11 +103,9 @@ TEST(DictParseTest, BooleansFloatsAndBytestrings) {
   VekMempool pool("bytes");
   {
     ref<vek::ByteBuffer> bytes = Dict::ParseBytestring(&pool, Text("Zm9v"));
-    EXPECT_EQ(Str(bytes), "foo");
-    EXPECT_EQ(Str(Dict::FormatBytestring(&pool, bytes)), "Zm9v");
+    EXPECT_EQ(Str(bytes) + " " + Str(Dict::FormatBytestring(&pool, bytes)), "foo Zm9v");
     ref<vek::ByteBuffer> bad = Dict::ParseBytestring(&pool, Text("Zm9"));
-    ASSERT_TRUE(bad);
-    EXPECT_EQ(bad->GetLength(), 0u);
+    EXPECT_TRUE(bad && bad->GetLength() == 0);
   }
   EXPECT_EQ(pool.GetUsedBytes(), 0u);
 }

@@ -41,6 +41,9 @@ inline ref<Dictionary> Parse(VekMempool* pool, std::string_view json, std::strin
   return isOk ? result : ref<Dictionary>();
 }
 
+// What a reader said: "accepted", or its message (read once the reader has returned).
+inline std::string ReaderVerdict(const ref<Dictionary>& tree, const std::string& error) { return tree ? "accepted" : error; }
+
 inline std::string Compact(const ref<DictValue>& value) { return value ? Str(value->ToJson(false)) : "(null)"; }
 inline std::string Pretty(const ref<DictValue>& value) { return value ? Str(value->ToJson(true)) : "(null)"; }
 

@@ -20,8 +20,8 @@ TEST_F(DictionaryJsonReaderTest, AcceptsTolerantShapesAndRefusesWithMessages) {
   }
   ref<Dictionary> tree = Read(&poolM, "{a:true, q:\"x\", u:\"\\u0041\"}");
   ASSERT_TRUE(tree);
-  EXPECT_FALSE(static_cast<StringValue*>(tree->Get(VekString("a")).Get())->needQuotesM);
-  EXPECT_TRUE(static_cast<StringValue*>(tree->Get(VekString("q")).Get())->needQuotesM);
+  EXPECT_TRUE(!static_cast<StringValue*>(tree->Get(VekString("a")).Get())->needQuotesM &&
+              static_cast<StringValue*>(tree->Get(VekString("q")).Get())->needQuotesM);
   EXPECT_EQ(Str(tree->GetString(VekString("u"))), "\\u0041") << "backslash-u stays as written";
 }
 
@@ -36,7 +36,7 @@ TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
   VekString error;
   EXPECT_TRUE(d->ReadFieldValue(input, VekString("arr"), error));
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(input.pCurM), input.pEndM - input.pCurM), " rest");
-  EXPECT_TRUE(d->ReadFieldValue(input, VekString("word"), error));
+  EXPECT_TRUE(d->ReadFieldValue(input, VekString("word"), error)) << Str(error);
   EXPECT_EQ(Compact(d), R"({"arr": [1, {"k": x}], "word": rest})");
 
   const std::string bad = " }";
@@ -55,8 +55,7 @@ TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
   }
   std::string list = "[\"a\", [true]] tail";
   InputPointer listInput = cursor(list);
-  EXPECT_TRUE(array->FromJson(listInput, error));
-  EXPECT_EQ(Compact(array), R"(["a", [true]])");
+  EXPECT_TRUE(array->FromJson(listInput, error) && Compact(array) == R"(["a", [true]])");
 }
 
 TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
@@ -71,9 +70,7 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
     std::string text = Compact(tree);
     EXPECT_EQ(text.size(), atLimit.size() + (limit / 2) * 1);  // a space after each colon
     ref<Dictionary> again = Read(&poolM, text);
-    ASSERT_TRUE(again);
-    EXPECT_TRUE(tree->Equals(again));
-    EXPECT_EQ(Pretty(tree).size() > text.size(), true);
+    EXPECT_TRUE(again && tree->Equals(again) && Pretty(tree).size() > text.size());
   });
   // Objects only, the costlier frames of the writer.
   std::string objects;
@@ -95,12 +92,10 @@ TEST_F(DictionaryJsonReaderTest, BoundsTheNestingDepth) {
 
   // A limit of our own, with the exact joined text.
   JsonLimits three(3);
-  EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three));
-  EXPECT_FALSE(Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
+  EXPECT_TRUE(Read(&poolM, "{a:[{}], b:{c:[]}}", &error, three) && !Read(&poolM, "{a:[1, {b:[]}]}", &error, three));
   EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 3 levels. Failed to parse value for key b "
                    "Failed to parse an array member. Failed to parse value for key a");
-  EXPECT_FALSE(Read(&poolM, "{}", &error, JsonLimits(0)));
-  EXPECT_EQ(error, "JSON nesting exceeds the depth limit of 0 levels.");
+  EXPECT_EQ(ReaderVerdict(Read(&poolM, "{}", &error, JsonLimits(0)), error), "JSON nesting exceeds the depth limit of 0 levels.");
 
   // Deep input far past the limit is refused without descending into it.
   EXPECT_FALSE(Read(&poolM, std::string(1, '{') + "a:" + std::string(1000000, '['), &error));
@@ -111,9 +106,8 @@ TEST_F(DictionaryJsonReaderTest, MatchesGoldenForms) {
   std::string dir = std::string(std::getenv("SARN_SOURCE_DIR") ? std::getenv("SARN_SOURCE_DIR") : ".") +
                     "/tests/data/dicts/";
   std::string input, compact, pretty;
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.json", input));
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.compact.json", compact));
-  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.pretty.json", pretty));
+  ASSERT_TRUE(sarntest::ReadFile(dir + "sample.json", input) && sarntest::ReadFile(dir + "sample.compact.json", compact) &&
+              sarntest::ReadFile(dir + "sample.pretty.json", pretty));
   std::string error;
   ref<Dictionary> tree = Read(&poolM, input, &error);
   ASSERT_TRUE(tree) << error;
@@ -123,9 +117,7 @@ TEST_F(DictionaryJsonReaderTest, MatchesGoldenForms) {
   ASSERT_TRUE(streamed) << error;
   EXPECT_FALSE(streamed->Equals(tree)) << "only the streaming parser decodes the \\u escape of the title";
   EXPECT_EQ(Str(streamed->GetString(VekString("title"))), "Caf\xC3\xA9 \"news\"\tfeed");
-  streamed->Remove(VekString("title"));
-  tree->Remove(VekString("title"));
-  EXPECT_TRUE(streamed->Equals(tree));
+  EXPECT_TRUE(streamed->Remove(VekString("title")) && tree->Remove(VekString("title")) && streamed->Equals(tree));
 }
 
 }  // namespace

@@ -68,17 +68,14 @@ TEST_F(DictionaryObjectTest, WorkedAddressBothWays) {
   const std::string text =
       "{\"addressId\": \"vask:ds.7\", \"city\": \"Oslo\", \"country\": \"NO\", \"levelOfDetail\": \"high\", "
       "\"postalCode\": \"0150\", \"state\": \"\", \"street1\": \"Main St 1\", \"type\": \"address\"}";
-  EXPECT_EQ(Tree(address.Get(), 42), text);
-  EXPECT_EQ(Json(address.Get(), 42), text);
+  EXPECT_EQ(Tree(address.Get(), 42) + "\n" + Json(address.Get(), 42), text + "\n" + text);
   ref<SarnObject> back;
   ASSERT_EQ(Read(converterM.SarnObjectToDictionary(address.Get(), 42), 42, &back), "ok");
-  EXPECT_EQ(Json(back.Get(), 0), Json(address.Get(), 0));
-  EXPECT_FALSE(static_cast<sarnschema::Address*>(back.Get())->fHasStreet2M);
+  EXPECT_TRUE(Json(back.Get(), 0) == Json(address.Get(), 0) && !static_cast<sarnschema::Address*>(back.Get())->fHasStreet2M);
   // A missing required field fails at a version and is left empty without one.
   const std::string noCity = "{\"addressId\": \"vask:ds.7\", \"type\": \"address\"}";
   EXPECT_EQ(Read(noCity, 42), "Required field not set: city");
-  EXPECT_EQ(Read(noCity, 0, &back), "ok");
-  EXPECT_EQ(static_cast<sarnschema::Address*>(back.Get())->cityM.NByte(), 0u);
+  EXPECT_TRUE(Read(noCity, 0, &back) == "ok" && static_cast<sarnschema::Address*>(back.Get())->cityM.NByte() == 0);
 }
 
 TEST_F(DictionaryObjectTest, FailureMessagesJoinFromTheInsideOut) {
@@ -113,18 +110,16 @@ TEST_F(DictionaryObjectTest, ScalarFailuresReplaceEarlierTextAndOthersAppend) {
   noTarget.refIndex = 0;
   unsigned int id = 99;
   VekString error;
-  EXPECT_FALSE(DictionarySarnObject::StringToIntId(&poolM, &noTarget, VekString("vask:rc.5"), error, id));
-  EXPECT_EQ(Str(error) + " " + std::to_string(id), "no struct for idbad prefix: vask:rc.5 99");
+  EXPECT_TRUE(!DictionarySarnObject::StringToIntId(&poolM, &noTarget, VekString("vask:rc.5"), error, id) &&
+              Str(error) + " " + std::to_string(id) == "no struct for idbad prefix: vask:rc.5 99") << Str(error);
 
   // The byte forms give the string forms' values and messages, reading only their n bytes (a
   // digit follows them here) and, like the string forms, numbers only up to a NUL.
   using D = DictionarySarnObject;
   const std::string nul(1, '\0');
-  const FieldInfo* ids[3] = {};  // the first int, long and string id fields
-  for (const FieldInfo& field : sarnschema::TestAllTypes::vFieldInfoG) {
-    int k = field.dataType == SARN_DATA_TYPE_INT_ID ? 0 : field.dataType == SARN_DATA_TYPE_LONG_ID ? 1 : 2;
-    if (ids[k] == nullptr && (k != 2 || field.dataType == SARN_DATA_TYPE_STRING_ID)) ids[k] = &field;
-  }
+  const StructInfo* info = object->GetStructInfo();
+  const FieldInfo* ids[3] = {&sarntest::FieldNamed(info, "idInt"), &sarntest::FieldNamed(info, "idLong"),
+                             &sarntest::FieldNamed(info, "idString")};
   for (std::string text : std::vector<std::string>{"vask:rc.17", "vask:rc.17" + nul + "9", "vask:r", "", "vask:of.x1",
                                                   "vask:ct.tms.ep.12", "vask:rc." + std::string(70, '1'),
                                                   "vask:ct.tms.ep.1" + nul + "2"}) {
@@ -153,8 +148,7 @@ TEST_F(DictionaryObjectTest, ValuesThatConvert) {
                  0, &object),
             "ok");
   auto* t = static_cast<sarnschema::TestAllTypes*>(object.Get());
-  ASSERT_EQ(t->stringMultiM.Count(), 1);
-  ASSERT_EQ(t->enumMultiM.Count(), 2);
+  ASSERT_TRUE(t->stringMultiM.Count() == 1 && t->enumMultiM.Count() == 2);
   EXPECT_EQ(Str(t->stringM) + "|" + Str(t->stringMultiM.Get(0)) + "|" + Str(t->idStringM), "one|single|x1");
   EXPECT_EQ(std::vector<long long>({t->idIntM, t->fHasIdIntOptionalM, t->idIntOptionalM, t->intM, t->longM,
                                     *static_cast<uint32_t*>(t->enumMultiM.Get(1)), t->booleanM,
@@ -190,8 +184,7 @@ TEST_F(DictionaryObjectTest, ObjectToDictionaryLeavesOutWhatIsAbsent) {
 TEST_F(DictionaryObjectTest, OlderRecordsServeTheirVersions) {
   const std::string json = "{\"type\": \"endUserMessage\", \"endUserMessageId\": \"vask:eum.5\"}";
   ref<SarnObject> v21, v22;
-  ASSERT_EQ(Read(json, 21, &v21), "ok");
-  ASSERT_EQ(Read(json, 22, &v22), "ok");
+  ASSERT_EQ(Read(json, 21, &v21) + Read(json, 22, &v22), "okok");
   auto* older = static_cast<sarnschema::EndUserMessage*>(v21.Get());
   auto* current = static_cast<sarnschema::EndUserMessage*>(v22.Get());
   EXPECT_EQ(std::vector<uint64_t>({older->endUserMessageIdUpTo21M, older->fHasEndUserMessageIdM,
@@ -215,8 +208,7 @@ TEST_F(DictionaryObjectTest, NestingIsBoundedByTheReadersLimit) {
   std::string expected = "Dictionary nesting exceeds the depth limit of 512 levels.";
   for (int i = 0; i < JsonLimits::kDefaultMaxDepth; ++i) expected += ". Can't unmarshal inner Dictionary. Bad single field: cause";
   EXPECT_EQ(Read(top, 0), expected);
-  EXPECT_EQ(Read(Parse(nested(3)), 0, nullptr, JsonLimits(3)), "ok");
-  EXPECT_NE(Read(Parse(nested(4)), 0, nullptr, JsonLimits(3)), "ok");
+  EXPECT_TRUE(Read(Parse(nested(3)), 0, nullptr, JsonLimits(3)) == "ok" && Read(Parse(nested(4)), 0, nullptr, JsonLimits(3)) != "ok");
   // Array elements count a level of their own, as in the JSON text.
   EXPECT_NE(Read(Parse("{\"type\": \"testAllTypes\", \"structMulti\": [{\"type\": \"success\"}]}"), 0, nullptr,
                  JsonLimits(2)),
@@ -242,11 +234,10 @@ TEST_F(DictionaryObjectTest, FilledObjectsRoundTrip) {
   ref<SarnObject> all = sarnschema::TestAllTypes::Factory(&poolM);
   sarntest::FillObject(&poolM, all.Get(), 1, 3);
   const std::string text = Json(all.Get(), 0);
-  // Every field is there, arrays of dictionaries and the escaped texts included.
-  EXPECT_NE(text.find("\"anyDictMulti\": [{\"key\": \"value\", \"n\": \"1\"},{\"key\": \"value\", \"n\": \"1\"}]"),
-            std::string::npos)
-      << text;
-  EXPECT_NE(text.find("\"idAnyBodyOptional\": \"Text "), std::string::npos) << text;
+  for (const FieldInfo& field : sarnschema::TestAllTypes::vFieldInfoG) {  // every field is there
+    const char* name = FieldName(all->GetStructInfo(), field);
+    EXPECT_TRUE(field.arity == SARN_ARITY_NONE || text.find("\"" + std::string(name) + "\": ") != std::string::npos) << name;
+  }
   ExpectRoundTrips(all.Get(), 0);
   for (unsigned id : {191u, 219u, 346u, 463u, 470u, 975u, 2416u}) {
     ref<SarnObject> object = StructInfoForId(id)->pFactory(&poolM);

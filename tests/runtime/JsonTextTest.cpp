@@ -20,7 +20,7 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, buffer));
   StringSink sink;
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, sink));
-  std::string fromBuffer(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength());
+  std::string fromBuffer = sarntest::Contents(buffer);
   EXPECT_EQ(fromBuffer, sink.textM) << "the two sinks disagree";
   return fromBuffer;
 }
@@ -35,13 +35,8 @@ TEST(JsonWriteTest, LongTextsAndSinkFailures) {
   std::string text;
   for (int i = 0; i < 3000; ++i) text += (i % 7 == 0) ? "\"q\"\n" : "plain text ";
   std::string expected = "\"";
-  for (char c : text) {
-    if (c == '"') expected += "\\\"";
-    else if (c == '\n') expected += "\\n";
-    else expected += c;
-  }
-  expected += "\"";
-  EXPECT_EQ(ToJson(text, true), expected);
+  for (char c : text) expected += c == '"' ? "\\\"" : c == '\n' ? "\\n" : std::string(1, c);
+  EXPECT_EQ(ToJson(text, true), expected + "\"");
 
   StringSink failing;
   failing.fFailM = true;
@@ -109,8 +104,8 @@ TEST_F(JsonTextTest, SourceReaderIsStricterAtTheEnd) {
       EXPECT_TRUE(!r.fOk && r.text == "untouched") << label;
     });
   }
-  EXPECT_EQ(ReadSource(&poolM, {std::string_view("ab\0cd", 5)}).Text(), "ok [ab] 2") << "a NUL ends a bare token";
-  EXPECT_EQ(ReadSource(&poolM, {}).Text(), "ok [] 0");
+  EXPECT_EQ(ReadSource(&poolM, {std::string_view("ab\0cd", 5)}).Text() + " | " + ReadSource(&poolM, {}).Text(), "ok [ab] 2 | ok [] 0")
+      << "a NUL ends a bare token";
 }
 
 TEST_F(JsonTextTest, QuotedStringStraddlesTheBlockBoundary) {
@@ -125,43 +120,34 @@ TEST_F(JsonTextTest, QuotedStringStraddlesTheBlockBoundary) {
   sarn::InputPointerBytesource cursor(&source);
   VekString result;
   ASSERT_TRUE(JsonBytesourceToString(&poolM, nullptr, cursor, result));
-  EXPECT_EQ(Str(result), fromMemory.text);
-  EXPECT_EQ(result.NByte(), body.size() / 12 * 11);
-  EXPECT_EQ(cursor.BytesDelivered(), input.size());
-  EXPECT_EQ(cursor.Next(), 't');
+  EXPECT_TRUE(Str(result) == fromMemory.text && result.NByte() == body.size() / 12 * 11);
+  EXPECT_TRUE(cursor.BytesDelivered() == input.size() && cursor.Next() == 't');
   // Without escapes the straddling run is gathered without losing a byte either.
   std::string plain = std::string(16380, ' ') + "\"0123456789\"";
   wynbaselib::InMemoryBytestream plainSource(plain);
   sarn::InputPointerBytesource plainCursor(&plainSource);
   ASSERT_TRUE(JsonBytesourceToString(&poolM, nullptr, plainCursor, result));
-  EXPECT_EQ(Str(result), "0123456789");
-  EXPECT_EQ(plainCursor.Peek(), 0);
+  EXPECT_TRUE(Str(result) == "0123456789" && plainCursor.Peek() == 0);
 }
 
-TEST_F(JsonTextTest, CursorOverMemoryNeverReadsItsSource) {
+// A cursor over memory has everything delivered at once and never reads a source; one over a
+// source counts what each refill delivered and never reads an ended source again.
+TEST_F(JsonTextTest, CursorsCountDeliveredBytesAndStopAtTheEnd) {
   const char text[] = " \t x";
-  sarn::InputPointerBytesource cursor(reinterpret_cast<const unsigned char*>(text), 4);
-  EXPECT_EQ(cursor.BytesDelivered(), 4u);
-  cursor.SkipWhitespace();
-  EXPECT_EQ(std::string({cursor.Peek(), cursor.Next()}), "xx");
-  EXPECT_EQ(cursor.Next(), 0);
-  EXPECT_FALSE(cursor.Refill());
-  EXPECT_EQ(cursor.BytesDelivered(), 4u);
-}
+  sarn::InputPointerBytesource memory(reinterpret_cast<const unsigned char*>(text), 4);
+  EXPECT_EQ(memory.BytesDelivered(), 4u);
+  memory.SkipWhitespace();
+  EXPECT_EQ(std::string({memory.Peek(), memory.Next()}), "xx");
+  EXPECT_TRUE(memory.Next() == 0 && !memory.Refill() && memory.BytesDelivered() == 4u);
 
-TEST_F(JsonTextTest, RefillCountsDeliveredBytesAndStopsAtTheEnd) {
   ChunkSource source({"ab", "cde", "", "f"});
   sarn::InputPointerBytesource cursor(&source);
-  EXPECT_EQ(cursor.BytesDelivered(), 0u);
-  EXPECT_EQ(cursor.Peek(), 'a');
-  EXPECT_EQ(cursor.BytesDelivered(), 2u);
+  EXPECT_TRUE(cursor.BytesDelivered() == 0 && cursor.Peek() == 'a' && cursor.BytesDelivered() == 2);
   std::string seen;
   while (char c = cursor.Next()) seen += c;
-  EXPECT_EQ(seen, "abcdef");
-  EXPECT_EQ(cursor.BytesDelivered(), 6u);
+  EXPECT_TRUE(seen == "abcdef" && cursor.BytesDelivered() == 6);
   int reads = source.nReadM;
-  EXPECT_EQ(cursor.Next(), 0);
-  EXPECT_FALSE(cursor.Refill());
+  EXPECT_TRUE(cursor.Next() == 0 && !cursor.Refill());
   EXPECT_EQ(source.nReadM, reads) << "an ended source is not read again";
 }
 
@@ -176,9 +162,7 @@ TEST_F(JsonTextTest, EchoCopiesExactlyTheConsumedBytesAcrossBlocks) {
     cursor.StartEcho(&sink);
     cursor.Next();
     while (cursor.Peek() == 'e') cursor.Next();
-    EXPECT_TRUE(cursor.StopEcho());
-    EXPECT_EQ(cursor.Next(), 'y');
-    EXPECT_EQ(sink.textM, "x" + std::string(40000, 'e'));
+    EXPECT_TRUE(cursor.StopEcho() && cursor.Next() == 'y' && sink.textM == "x" + std::string(40000, 'e'));
   }
   ChunkSource source({"abc", "def"});
   sarn::InputPointerBytesource cursor(&source);
@@ -186,8 +170,7 @@ TEST_F(JsonTextTest, EchoCopiesExactlyTheConsumedBytesAcrossBlocks) {
   failing.fFailM = true;
   cursor.StartEcho(&failing);
   for (int i = 0; i < 4; ++i) cursor.Next();
-  EXPECT_FALSE(cursor.StopEcho());
-  EXPECT_EQ(failing.textM, "abcd");
+  EXPECT_TRUE(!cursor.StopEcho() && failing.textM == "abcd");
 }
 
 }  // namespace

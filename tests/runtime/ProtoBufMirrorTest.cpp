@@ -1,10 +1,9 @@
 // The binary form is the protocol-buffer encoding, checked against a protocol-buffer library
 // through the generated mirror: a bridge builds the library's message from one of our objects by
 // reflection (every REQUIRED field set, so that the library writes it even at its default), and for
-// hand-made and seeded random objects the library writes our bytes, reads our bytes into the same
-// message, and we read the library's bytes and write them back unchanged.
+// filled and seeded random objects the library writes our bytes, and we read the library's bytes
+// and write them back unchanged.
 #include <google/protobuf/descriptor.h>
-#include <google/protobuf/util/message_differencer.h>
 #include <gtest/gtest.h>
 
 #include <string>
@@ -58,9 +57,7 @@ void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, M
   const Reflection* r = out->GetReflection();
   const bool isMulti = fd->is_repeated();
   auto put = [&](auto value, auto add, auto set) { isMulti ? (r->*add)(out, fd, value) : (r->*set)(out, fd, value); };
-  auto text = [&](const VekString& s) {
-    put(std::string(s.Utf8(), s.NByte()), &Reflection::AddString, &Reflection::SetString);
-  };
+  auto text = [&](const VekString& s) { put(sarntest::Str(s), &Reflection::AddString, &Reflection::SetString); };
   switch (field.dataType) {
     case SARN_DATA_TYPE_BOOL:
       return put(FieldAccess::ScalarValue<uint8_t>(object, field, i) != 0, &Reflection::AddBool, &Reflection::SetBool);
@@ -88,9 +85,7 @@ void BridgeValue(const SarnObject* object, const FieldInfo& field, unsigned i, M
   }
   VekCore* value = FieldAccess::ReferenceAt(object, field, i);
   if (field.dataType == SARN_DATA_TYPE_BYTESTRING) {
-    auto* bytes = static_cast<const vek::ByteBuffer*>(value);
-    return put(std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength()), &Reflection::AddString,
-               &Reflection::SetString);
+    return put(sarntest::Contents(*static_cast<const vek::ByteBuffer*>(value)), &Reflection::AddString, &Reflection::SetString);
   }
   Message* message = isMulti ? r->AddMessage(out, fd) : r->MutableMessage(out, fd);
   switch (field.dataType) {
@@ -130,22 +125,20 @@ std::string Marshal(const ProtoBuf& codec, const SarnObject* object, bool isKnow
 
 const unsigned char* Bytes(const std::string& s) { return reinterpret_cast<const unsigned char*>(s.data()); }
 
-// The three agreements for one object (the last only when it can read back: a default object
-// writes its REQUIRED channel numbers and currencies as "invalid", which we refuse to read).
+// The library writes our bytes from the bridged message, and (only when it can read back: a
+// default object writes its REQUIRED channel numbers and currencies as "invalid", which we refuse
+// to read) we read the library's bytes and write them back unchanged. The library reading our
+// bytes into the same message follows from the first: its serialization is deterministic.
 void ExpectAgreement(const ProtoBuf& codec, const SarnObject* object, const std::string& what,
                      bool isReadBack = true) {
   std::string ours = Marshal(codec, object);
   sarnmirror::KnownDict bridged;
   BridgeKnown(object, &bridged);
   ASSERT_EQ(bridged.SerializeAsString(), ours) << what;
-  sarnmirror::KnownDict parsed;
-  ASSERT_TRUE(parsed.ParseFromString(ours)) << what;
-  EXPECT_TRUE(google::protobuf::util::MessageDifferencer::Equals(parsed, bridged)) << what;
   if (!isReadBack) return;
-  std::string theirs = bridged.SerializeAsString();
   ref<SarnObject> read;
-  ASSERT_TRUE(codec.UnmarshalKnownDict(Bytes(theirs), static_cast<int>(theirs.size()), &read)) << what;
-  EXPECT_EQ(Marshal(codec, read.Get()), theirs) << what;
+  ASSERT_TRUE(codec.UnmarshalKnownDict(Bytes(ours), static_cast<int>(ours.size()), &read)) << what;
+  EXPECT_EQ(Marshal(codec, read.Get()), ours) << what;
 }
 
 }  // namespace
@@ -181,11 +174,9 @@ TEST(ProtoBufMirrorTest, ASubObjectGivenTwiceKeepsTheLater) {
   ProtoBuf codec(&pool, Schema::vStructDefG, Schema::nStructDefG);
   std::string twice("\xba\x03\x03\x0a\x01\x61\xba\x03\x00", 9);  // struct (55) {message "a"}, then struct {}
   sarnmirror::TestAllTypes peer;
-  ASSERT_TRUE(peer.ParseFromString(twice));
-  EXPECT_TRUE(peer.struct_().has_message());
+  EXPECT_TRUE(peer.ParseFromString(twice) && peer.struct_().has_message());
   ref<SarnObject> read;
   ASSERT_TRUE(codec.Unmarshal(Bytes(twice), static_cast<int>(twice.size()), 1259, &read));
   sarnmirror::TestAllTypes ours;
-  ASSERT_TRUE(ours.ParseFromString(Marshal(codec, read.Get(), false)));
-  EXPECT_FALSE(ours.struct_().has_message());
+  EXPECT_TRUE(ours.ParseFromString(Marshal(codec, read.Get(), false)) && !ours.struct_().has_message());
 }

@@ -62,8 +62,8 @@ TEST(SarnHashTableUtilTest, HashMatchesTheReference) {
   for (size_t n = 0; n <= 40; key.push_back(static_cast<char>(random())), ++n) {
     EXPECT_EQ(Hash(key), ReferenceHash(key)) << n << " bytes";
   }
-  EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash(nullptr), 0u);
-  EXPECT_EQ(SarnHashTableUtilTemplate<const char*>::DefaultHash("address"), Hash("address"));
+  EXPECT_TRUE(SarnHashTableUtilTemplate<const char*>::DefaultHash(nullptr) == 0 &&
+              SarnHashTableUtilTemplate<const char*>::DefaultHash("address") == Hash("address"));
 }
 
 // A small instantiation: 2 inline nodes, so blocks are exercised early.
@@ -96,16 +96,13 @@ TEST_F(SarnHashTableTest, PutFindsAddsAndGrowsAtTheLoadLimit) {
   ASSERT_TRUE(first != nullptr && first->FEmpty());
   *first = VekString("zero");
   std::string sameContent = keysM[0];
-  EXPECT_TRUE(table.Put(sameContent.c_str(), value)) << "keys compare by content";
-  EXPECT_EQ(value, first);
+  EXPECT_TRUE(table.Put(sameContent.c_str(), value) && value == first) << "keys compare by content";
   // 53 * 75 / 100 = 39 entries fit the inline buckets, 769 * 75 / 100 = 576 the next step.
   for (int i = 1; i < 39; ++i) ASSERT_FALSE(table.Put(keysM[i].c_str(), value));
   EXPECT_EQ(shape(), "39 in 53 step 0 inline");
-  EXPECT_FALSE(table.Put(keysM[39].c_str(), value));
-  EXPECT_EQ(shape(), "40 in 769 step 1");
+  EXPECT_TRUE(!table.Put(keysM[39].c_str(), value) && shape() == "40 in 769 step 1") << shape();
   // Every entry survives the move to the new buckets, at the same address.
-  EXPECT_TRUE(table.Put(keysM[0].c_str(), value));
-  EXPECT_TRUE(value == first && Str(*value) == "zero");
+  EXPECT_TRUE(table.Put(keysM[0].c_str(), value) && value == first && Str(*value) == "zero");
   for (int i = 0; i < 40; ++i) ASSERT_TRUE(table.Put(keysM[i].c_str(), value)) << i;
   for (int i = 40; i < 576; ++i) table.Put(keysM[i].c_str(), value);
   EXPECT_EQ(shape(), "576 in 769 step 1");
@@ -115,8 +112,7 @@ TEST_F(SarnHashTableTest, PutFindsAddsAndGrowsAtTheLoadLimit) {
   VekString *null1, *null2, *empty;
   EXPECT_FALSE(table.Put(nullptr, null1));
   EXPECT_FALSE(table.Put("", empty));
-  EXPECT_TRUE(table.Put(nullptr, null2));
-  EXPECT_TRUE(null1 == null2 && null1 != empty);
+  EXPECT_TRUE(table.Put(nullptr, null2) && null1 == null2 && null1 != empty);
 }
 
 TEST_F(SarnHashTableTest, BlocksAreTakenFromThePoolAndReturnedByClear) {
@@ -142,10 +138,8 @@ TEST_F(SarnHashTableTest, BlocksAreTakenFromThePoolAndReturnedByClear) {
     node = node->pNextM;
   } while (node != table.pFreeM);
   EXPECT_EQ(nFree, 2);
-  EXPECT_FALSE(table.Put(keysM[5].c_str(), value));
-  EXPECT_TRUE(value->FEmpty()) << "a reused node's value was cleared";
-  EXPECT_TRUE(table.Put(keysM[5].c_str(), value));
-  EXPECT_EQ(poolM.GetUsedBytes(), 0u);
+  EXPECT_TRUE(!table.Put(keysM[5].c_str(), value) && value->FEmpty()) << "a reused node's value was cleared";
+  EXPECT_TRUE(table.Put(keysM[5].c_str(), value) && poolM.GetUsedBytes() == 0);
 }
 
 TEST_F(SarnHashTableTest, NameTableHoldsItsInlineNodesWithoutAllocating) {
@@ -162,8 +156,7 @@ TEST_F(SarnHashTableTest, NameTableHoldsItsInlineNodesWithoutAllocating) {
 TEST_F(SarnHashTableTest, GlobalNameCacheSharesNamesAndIsRebuilt) {
   sarn::DestroyGlobalSarnHashTable();
   const VekString* first = sarn::GetGlobalName(&poolM, "channelIdentifier");
-  ASSERT_NE(first, nullptr);
-  EXPECT_EQ(Str(*first), "channelIdentifier");
+  ASSERT_TRUE(first != nullptr && Str(*first) == "channelIdentifier");
   std::string other = "channelIdentifier";
   EXPECT_EQ(sarn::GetGlobalName(&poolM, other.c_str()), first) << "equal names share one string";
   VekString kept = *first;
@@ -174,8 +167,7 @@ TEST_F(SarnHashTableTest, GlobalNameCacheSharesNamesAndIsRebuilt) {
   sarn::DestroyGlobalSarnHashTable();
   EXPECT_EQ(Str(kept), "channelIdentifier") << "a copy outlives the cache";
   const VekString* rebuilt = sarn::GetGlobalName(&poolM, "channelIdentifier");
-  ASSERT_NE(rebuilt, nullptr);
-  EXPECT_EQ(Str(*rebuilt), "channelIdentifier");
+  ASSERT_TRUE(rebuilt != nullptr && Str(*rebuilt) == "channelIdentifier");
   EXPECT_EQ(sarn::GetGlobalName(&poolM, keysM[4000].c_str()), sarn::GetGlobalName(nullptr, keysM[4000].c_str()));
   sarn::DestroyGlobalSarnHashTable();
 }
@@ -205,8 +197,7 @@ TEST_F(SarnHashTableTest, GlobalNameCacheFromTwoThreads) {
   for (size_t i = 0; i < keysM.size(); ++i) {
     const VekString* fromA = seen[0][i];
     const VekString* fromB = seen[1][keysM.size() - 1 - i];
-    ASSERT_EQ(fromA, fromB) << keysM[i];
-    ASSERT_EQ(Str(*fromA), keysM[i]);
+    ASSERT_TRUE(fromA == fromB && Str(*fromA) == keysM[i]) << keysM[i];
   }
   sarn::DestroyGlobalSarnHashTable();
 }

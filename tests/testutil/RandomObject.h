@@ -1,9 +1,11 @@
-// Seeded random schema objects built through the metadata, for property tests of every converter:
-// optional fields present or not, arrays of zero to three elements, values at and between the
-// extremes of their types, free-form dictionaries with repeated and nested values, lazy fields
-// holding objects. Every value has a text that reads back (named enum values, channel numbers and
-// currencies that parse, printable strings with characters JSON must escape), so one object can
-// travel through every form. Header-only, so that benchmarks can use it without the test library.
+// Seeded schema objects built through the metadata, the one object builder of the tests and
+// benchmarks: optional fields present or not and arrays of zero to three elements, or (fills)
+// every field set with a fixed number of elements; values at and between the extremes of their
+// types, free-form dictionaries with repeated and nested values, lazy fields holding objects.
+// Every value has a text that reads back (named enum values, channel numbers and currencies that
+// parse, printable strings with characters JSON must escape), so one object can travel through
+// every form. The same seed builds equal objects. Header-only, so that benchmarks can use it
+// without the test library.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +13,6 @@
 #include <vector>
 
 #include "sarn/Sarn.h"
-#include "testutil/ObjectFill.h"
 
 namespace sarntest {
 
@@ -28,9 +29,14 @@ class RandomObjects {
   // False: strings hold no control characters, whose escapes one JSON reader decodes and the
   // other keeps as text, so that an object reads back alike through both.
   bool isWithControlsM = true;
+  // True: strings hold only letters, digits and spaces.
+  bool isPlainM = false;
+  // At zero or more: every field is set, arrays with this many elements.
+  int nEveryM = -1;
 
   ref<sarn::SarnObject> Make(unsigned typeId) { return Make(typeId, maxDepthM); }
   ref<sarn::SarnObject> MakeKnown() { return Make(knownTypesM[Next(knownTypesM.size())], maxDepthM); }
+  void Fill(sarn::SarnObject* object) { Fill(object, maxDepthM); }
 
   uint64_t Next() {  // splitmix64
     uint64_t z = (stateM += 0x9E3779B97F4A7C15ull);
@@ -42,21 +48,36 @@ class RandomObjects {
 
  private:
   ref<sarn::SarnObject> Make(unsigned typeId, int depth) {
+    const sarn::StructInfo* info = sarn::StructInfoForId(typeId);
+    if (info == nullptr) return ref<sarn::SarnObject>();
+    ref<sarn::SarnObject> object = info->pFactory(pPoolM);
+    Fill(object.Get(), depth);
+    return object;
+  }
+
+  void Fill(sarn::SarnObject* object, int depth) {
     using namespace sarn;
-    const StructInfo* info = StructInfoForId(typeId);
-    if (info == nullptr) return ref<SarnObject>();
-    ref<SarnObject> object = info->pFactory(pPoolM);
+    const StructInfo* info = object->GetStructInfo();
     for (unsigned n = 0; n < info->nFieldInfo; ++n) {
       const FieldInfo& field = info->vFieldInfo[n];
       if (field.arity == SARN_ARITY_NONE || field.dataType > SARN_DATA_TYPE_U64) continue;
-      bool isRequired = field.arity == SARN_ARITY_REQUIRED;
+      bool isRequired = field.arity == SARN_ARITY_REQUIRED || nEveryM >= 0;
       if (!isRequired && (Next(3) == 0 || (!isWithBytesM && field.dataType == SARN_DATA_TYPE_BYTESTRING))) continue;
-      unsigned count = field.arity == SARN_ARITY_MULTI ? static_cast<unsigned>(Next(4)) : 1;
+      unsigned count = field.arity != SARN_ARITY_MULTI ? 1 : nEveryM >= 0 ? nEveryM : static_cast<unsigned>(Next(4));
       bool isSet = true;
-      for (unsigned e = 0; e < count && isSet; ++e) isSet = PutValue(object.Get(), field, depth, isRequired);
-      if (isSet || isRequired) MarkFieldPresent(object.Get(), field);
+      for (unsigned e = 0; e < count && isSet; ++e) isSet = PutValue(object, field, depth, isRequired);
+      if (isSet || isRequired) MarkFieldPresent(object, field);
     }
-    return object;
+  }
+
+  // The first named value of enum `enumId` at or after a random one (wrapping), or 0.
+  uint32_t SomeEnumValue(unsigned enumId) {
+    const sarn::EnumDef* def = sarn::EnumDefForId(enumId);
+    uint64_t start = static_cast<unsigned>(Next());
+    for (uint64_t k = 0; def != nullptr && k < def->nValue; ++k) {
+      if (def->vName[(start + k) % def->nValue] != nullptr) return static_cast<uint32_t>((start + k) % def->nValue);
+    }
+    return 0;
   }
 
   // Adds (MULTI) or sets one value; false when a nested object was not made at this depth.
@@ -70,7 +91,7 @@ class RandomObjects {
       case SARN_DATA_TYPE_TIME: return Put(object, field, Time{static_cast<int>(Next(86400)) * 1000});
       case SARN_DATA_TYPE_DATETIME:
         return Put(object, field, DateTime{(static_cast<long long>(Next(8000000000ull)) - 4000000000ll) * 1000});
-      case SARN_DATA_TYPE_ENUM: return Put(object, field, SomeEnumValue(field.refIndex, static_cast<unsigned>(Next())));
+      case SARN_DATA_TYPE_ENUM: return Put(object, field, SomeEnumValue(field.refIndex));
       case SARN_DATA_TYPE_S32:
         return Put(object, field, Next(2) ? kS32[Next(5)] : static_cast<int32_t>(static_cast<uint32_t>(Next())));
       case SARN_DATA_TYPE_INT_ID:
@@ -111,9 +132,12 @@ class RandomObjects {
     if (depth <= 0 && (!isRequired || depth < -4)) return false;
     unsigned typeId = field.dataType == SARN_DATA_TYPE_SUBDICT ? field.refIndex
                                                                : knownTypesM[Next(knownTypesM.size())];
-    ref<SarnObject> value = Make(typeId, depth - 1);
+    // Fills give lazy fields a fresh object: a payload writes an object it holds type first and a
+    // tree it has read in name order, so only an object without fields reads back the same text.
+    bool isLazy = field.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY;
+    ref<SarnObject> value = isLazy && nEveryM >= 0 ? StructInfoForId(typeId)->pFactory(pPoolM) : Make(typeId, depth - 1);
     if (!value) return false;
-    if (field.dataType == SARN_DATA_TYPE_KNOWN_DICT_AS_LAZY) {
+    if (isLazy) {
       FieldAccess::PutReference(object, field, LazyDict::FromSarnObject(pPoolM, value, 0).Get());
     } else {
       FieldAccess::PutReference(object, field, value.Get());
@@ -127,13 +151,13 @@ class RandomObjects {
     return true;
   }
 
-  // Zero to twelve characters: letters, digits, and what JSON escapes or keeps as is.
+  // Zero to twelve pieces: letters, digits, and what JSON escapes or keeps as is.
   std::string RandomText() {
     static const char* const kPieces[] = {"a", "Z", "7", " ", "\"", "\\", "/", "\t", "\n", "\x01", "\xC3\xA9",
                                           "\xE2\x82\xAC", "\xF0\x9F\x98\x80", "~"};
     std::string text;
     for (uint64_t n = Next(13); n > 0; --n) {
-      const char* piece = kPieces[Next(sizeof kPieces / sizeof kPieces[0])];
+      const char* piece = kPieces[Next(isPlainM ? 4 : sizeof kPieces / sizeof kPieces[0])];
       text += isWithControlsM || static_cast<unsigned char>(piece[0]) >= 0x20 ? piece : "~";
     }
     return text;

@@ -18,11 +18,15 @@ inline void Require(bool condition) {
   if (!condition) std::abort();
 }
 
+// The bytes of anything that holds bytes (GetData and GetLength: buffers, byte strings).
+template <typename Bytes>
+std::string Contents(const Bytes& bytes) {
+  return std::string(reinterpret_cast<const char*>(bytes.GetData()), bytes.GetLength());
+}
+
 // The bytes of a string or a byte string, NUL bytes included.
 inline std::string Str(const VekString& text) { return std::string(text.Utf8(), text.NByte()); }
-inline std::string Str(const ref<vek::ByteBuffer>& bytes) {
-  return std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
-}
+inline std::string Str(const ref<vek::ByteBuffer>& bytes) { return Contents(*bytes); }
 
 // The protocol-buffer varint of `value`.
 inline std::string Varint(uint64_t value) {
@@ -54,6 +58,13 @@ inline ref<sarn::SarnObject> ReadKnownDict(VekMempool* pool, const std::string& 
   return object;
 }
 
+// Everything a byte source delivers, read `block` bytes at a time.
+inline std::string ReadAll(wynbaselib::Bytesource& source, size_t block) {
+  std::string out, buffer(block, '\0');
+  for (size_t n; (n = source.Read(&buffer[0], block)) > 0;) out.append(buffer, 0, n);
+  return out;
+}
+
 // Splits `input` into chunks of `size` bytes (the last one shorter).
 inline std::vector<std::string_view> FixedChunks(std::string_view input, size_t size) {
   std::vector<std::string_view> chunks;
@@ -76,74 +87,65 @@ inline ref<sarn::Dictionary> StreamParse(VekMempool* pool, const std::vector<std
   return result;
 }
 
-// A byte source that hands out the given chunks, one per Read (a chunk larger than the request
-// goes in pieces), counts its reads, reports an error at its end when `isFailing`, and adds one
-// to `*pDeleted` when it is deleted.
-class TestSource : public wynbaselib::Bytesource {
- public:
-  TestSource(const std::vector<std::string_view>& chunks, int* pDeleted = nullptr, bool isFailing = false)
-      : chunksM(chunks.begin(), chunks.end()), pDeletedM(pDeleted), isFailingM(isFailing) {}
-  ~TestSource() override {
-    if (pDeletedM != nullptr) ++*pDeletedM;
-  }
-  size_t Read(void* buffer, size_t size) override {
-    ++nReadM;
-    while (indexM < chunksM.size() && offsetM == chunksM[indexM].size()) ++indexM, offsetM = 0;
-    if (indexM == chunksM.size()) return 0;
-    size_t n = std::min(size, chunksM[indexM].size() - offsetM);
-    std::memcpy(buffer, chunksM[indexM].data() + offsetM, n);
-    offsetM += n;
-    return n;
-  }
-  Bytesource* Duplicate() override { return nullptr; }
-  bool FError() const override { return isFailingM; }
-  const char* GetErrorText() const override { return isFailingM ? "truncated stream" : ""; }
-  int nReadM = 0;
-
- private:
-  std::vector<std::string> chunksM;
-  size_t indexM = 0, offsetM = 0;
-  int* pDeletedM;
-  bool isFailingM;
-};
-
-// An in-memory stream that delivers at most `piece` bytes per read (0: no bound) and counts, in
-// `counters` when given, the duplicates made and the streams deleted, so that a test can see that
-// a reader deleted what it asked for.
-class PieceSource : public wynbaselib::InMemoryBytestream {
+// A byte source over the given chunks for readers under test: a Read delivers at most the rest of
+// the current chunk (empty chunks are skipped) and, when `pieceM` is set, at most that many bytes.
+// It counts its reads, reports an error when `isFailing`, adds one to `*pDeleted` when deleted,
+// and makes duplicates (reading on from where it is) only when `canDuplicateM`; `pCountersM`, when
+// set, counts the duplicates made, the sources deleted and the reads of the original.
+class TestSource : public wynbaselib::InMemoryBytestream {
  public:
   struct Counters {
     int nDuplicatedM = 0;
     int nDeletedM = 0;
     int nOwnReadsM = 0;  // reads of the source first made, not of its duplicates
   };
-  PieceSource(const std::string& text, size_t piece, Counters* counters = nullptr, bool canDuplicate = true)
-      : InMemoryBytestream(text), pieceM(piece), pCountersM(counters), canDuplicateM(canDuplicate) {}
-  PieceSource(const PieceSource& other)
-      : InMemoryBytestream(other),
-        pieceM(other.pieceM),
-        pCountersM(other.pCountersM),
-        isOriginalM(false),
-        canDuplicateM(other.canDuplicateM) {}
-  ~PieceSource() override {
+  TestSource(const std::vector<std::string_view>& chunks, int* pDeleted = nullptr, bool isFailing = false)
+      : InMemoryBytestream(Join(chunks)), pDeletedM(pDeleted), isFailingM(isFailing) {
+    for (std::string_view chunk : chunks) cutsM.push_back((cutsM.empty() ? 0 : cutsM.back()) + chunk.size());
+  }
+  ~TestSource() override {
+    if (pDeletedM != nullptr) ++*pDeletedM;
     if (pCountersM != nullptr) ++pCountersM->nDeletedM;
   }
   size_t Read(void* buffer, size_t size) override {
+    ++nReadM;
     if (pCountersM != nullptr && isOriginalM) ++pCountersM->nOwnReadsM;
+    auto cut = std::upper_bound(cutsM.begin(), cutsM.end(), GetPosition());
+    if (cut != cutsM.end()) size = std::min(size, *cut - GetPosition());
     return InMemoryBytestream::Read(buffer, pieceM != 0 ? std::min(size, pieceM) : size);
   }
-  // Null when made unable to duplicate.
   Bytesource* Duplicate() override {
     if (!canDuplicateM) return nullptr;
     if (pCountersM != nullptr) ++pCountersM->nDuplicatedM;
-    return new PieceSource(*this);
+    auto* copy = new TestSource(*this);
+    copy->isOriginalM = false;
+    return copy;
   }
+  bool FError() const override { return isFailingM; }
+  const char* GetErrorText() const override { return isFailingM ? "truncated stream" : ""; }
+  int nReadM = 0;
+  size_t pieceM = 0;
+  Counters* pCountersM = nullptr;
+  bool canDuplicateM = false;
 
  private:
-  size_t pieceM;
-  Counters* pCountersM;
+  static std::string Join(const std::vector<std::string_view>& chunks) {
+    std::string text;
+    for (std::string_view chunk : chunks) text += chunk;
+    return text;
+  }
+  std::vector<size_t> cutsM;  // where each chunk ends
+  int* pDeletedM;
+  bool isFailingM;
   bool isOriginalM = true;
-  bool canDuplicateM;
+};
+
+// One text delivered at most `piece` bytes a read (0: no bound), duplicable unless told otherwise.
+struct PieceSource : TestSource {
+  PieceSource(const std::string& text, size_t piece, Counters* counters = nullptr, bool canDuplicate = true)
+      : TestSource({text}) {
+    pieceM = piece, pCountersM = counters, canDuplicateM = canDuplicate;
+  }
 };
 
 // A sink that keeps what it is given; with `fFailM` set every write and flush fails.

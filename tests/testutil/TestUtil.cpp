@@ -1,7 +1,6 @@
 #include "testutil/TestUtil.h"
 
 #include <pthread.h>
-#include <sys/stat.h>
 
 #include <algorithm>
 #include <cctype>
@@ -35,15 +34,6 @@ void RunOnStack(size_t bytes, const std::function<void()>& work) {
   ASSERT_EQ(pthread_create(&thread, &attributes, call, const_cast<std::function<void()>*>(&work)), 0);
   pthread_join(thread, nullptr);
   pthread_attr_destroy(&attributes);
-}
-
-std::string CorpusDir(const std::string& name) {
-  const char* root = std::getenv("SARN_CORPORA_DIR");
-  if (root == nullptr) return "";
-  std::string path = std::string(root) + "/" + name;
-  struct stat info;
-  if (stat(path.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) return "";
-  return path;
 }
 
 bool ReadFile(const std::string& path, std::string& out) {

@@ -27,13 +27,22 @@ class PoolTest : public ::testing::Test {
   VekMempool poolM;
 };
 
+// The current record of the field named `name` of a type (a failure, and the last record, when
+// there is none).
+inline const sarn::FieldInfo& FieldNamed(const sarn::StructInfo* info, const char* name) {
+  unsigned n = 0;
+  while (n + 1 < info->nFieldInfo && (info->vFieldInfo[n].arity == sarn::SARN_ARITY_NONE ||
+                                      std::string_view(sarn::FieldName(info, info->vFieldInfo[n])) != name)) {
+    ++n;
+  }
+  EXPECT_STREQ(sarn::FieldName(info, info->vFieldInfo[n]), name);
+  return info->vFieldInfo[n];
+}
+
 // Runs `work` on a thread with a native stack of `bytes` (256 KiB is what the depth limits
 // promise a whole read, write, compare and release fits in). Sanitizers and unoptimised builds
 // multiply frame sizes, so they get eight times the room; the promise is about release builds.
 void RunOnStack(size_t bytes, const std::function<void()>& work);
-
-// A folder of the shared public corpora, or "" when it is absent (tests then skip).
-std::string CorpusDir(const std::string& name);
 
 // Reads a whole file; false when it cannot be read.
 bool ReadFile(const std::string& path, std::string& out);
