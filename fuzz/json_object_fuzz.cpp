@@ -3,7 +3,7 @@
 // Oracles: no crash, leak or hang; the memory and byte-source entries agree (verdict, written
 // object or message), delete both duplicates and leave the source where it was; an accepted object
 // writes JSON (version 0) that reads back to an object writing the same text, except for texts of
-// the writer that this reader refuses (below); where the Dictionary path (Dictionary::FromJson,
+// the writer that this reader refuses (below) and string ids cut to the 99 bytes of their text; where the Dictionary path (Dictionary::FromJson,
 // then DictionaryToSarnObject at version 0) accepts the text too, both objects write the same
 // JSON, except for the differences that the two paths make by design (below).
 //
@@ -47,6 +47,21 @@ bool RepeatsName(const Dictionary& tree) {
   });
 }
 
+// True when a string id's text (its type's prefix, then the value) is longer than the 99 bytes its
+// written form holds: the writer cuts it, possibly inside a backslash-u escape, so the written
+// text does not read back to the same object.
+bool HoldsCutId(const SarnObject* object) {
+  return dictfuzz::AnyField(object, [](const SarnObject* o, const FieldInfo& field) {
+    if (field.dataType != SARN_DATA_TYPE_STRING_ID) return false;
+    const StructInfo* target = field.refIndex < Schema::nStructDefG ? Schema::vStructDefG[field.refIndex] : nullptr;
+    size_t nPrefix = target != nullptr && target->pIdPrefix != nullptr ? std::strlen(target->pIdPrefix) : 0;
+    for (unsigned i = 0; i < FieldAccess::Count(o, field); ++i) {
+      if (nPrefix + FieldAccess::StringAt(o, field, i).NByte() > 99) return true;
+    }
+    return false;
+  });
+}
+
 bool RefusedWhenWritten(const std::string& text) {
   return dictfuzz::HoldsUnnamedValue(text) || text.find("\"invalid\"") != std::string::npos ||
          text.find("{}") != std::string::npos || text.find("\\u00") != std::string::npos;
@@ -67,7 +82,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     Require(dictfuzz::ReadObject(&pool, reader, text, piece, viaSource) == memory);
     if (!object) return;
     const std::string second = dictfuzz::ReadObject(&pool, reader, memory, 0, again);
-    Require(again ? second == memory : RefusedWhenWritten(memory));
+    Require(again ? second == memory || HoldsCutId(again.Get()) : RefusedWhenWritten(memory));
 
     VekString treeError;
     ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(text.data()), text.size(),
