@@ -14,11 +14,8 @@ std::string Kinds(const ref<ArrayValue>& array) {
   std::string kinds;
   for (unsigned i = 0; i < array->CountValues(); ++i) {
     ref<DictValue> value = array->GetValueAt(i);
-    if (value->kindM == DictValue::KIND_STRING) {
-      kinds += static_cast<StringValue*>(value.Get())->needQuotesM ? "q" : "b";
-    } else {
-      kinds += value->kindM == DictValue::KIND_NULL ? "n" : "?";
-    }
+    bool isString = value->kindM == DictValue::KIND_STRING;
+    kinds += isString ? (static_cast<StringValue*>(value.Get())->needQuotesM ? "q" : "b") : value->kindM == DictValue::KIND_NULL ? "n" : "?";
   }
   return kinds;
 }
