@@ -118,8 +118,7 @@ TEST_F(CoreTest, ConcurrentUpAndDownRefsAreExact) {
   std::thread releaser([&] {
     for (int i = 0; i < kObjects; ++i) {
       Leaf* p;
-      while ((p = handOff.exchange(nullptr)) == nullptr) {
-      }
+      while ((p = handOff.exchange(nullptr)) == nullptr) {}
       p->DownRef();
     }
   });
@@ -127,8 +126,7 @@ TEST_F(CoreTest, ConcurrentUpAndDownRefsAreExact) {
     Leaf* p = new (&poolM) Leaf;
     p->UpRef();
     p->UpRef();
-    while (handOff.load() != nullptr) {
-    }
+    while (handOff.load() != nullptr) {}
     handOff.store(p);
     p->DownRef();
   }

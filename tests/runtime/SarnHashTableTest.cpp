@@ -177,8 +177,7 @@ TEST_F(SarnHashTableTest, GlobalNameCacheFromTwoThreads) {
   std::vector<const VekString*> seen[2];
   std::atomic<bool> go(false);
   auto work = [&](int which) {
-    while (!go.load()) {
-    }
+    while (!go.load()) {}
     // The two threads walk the names in opposite orders so that they create and find the
     // same entries at the same time.
     for (int round = 0; round < 3; ++round) {
