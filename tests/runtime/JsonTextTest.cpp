@@ -66,8 +66,7 @@ ReadResult ReadSource(VekMempool* pool, const std::vector<std::string_view>& chu
   sarn::InputPointerBytesource cursor(&source);
   VekString result("untouched");
   bool fOk = JsonBytesourceToString(pool, nullptr, cursor, result);
-  size_t consumed = static_cast<size_t>(cursor.BytesDelivered() - static_cast<uint64_t>(cursor.pEndM - cursor.pCurM));
-  return {fOk, Str(result), consumed};
+  return {fOk, Str(result), static_cast<size_t>(cursor.BytesDelivered() - static_cast<uint64_t>(cursor.pEndM - cursor.pCurM))};
 }
 
 TEST_F(JsonTextTest, MemoryReaderStringsBareTokensAndFailures) {
