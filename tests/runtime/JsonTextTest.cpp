@@ -20,9 +20,8 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, buffer));
   StringSink sink;
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, sink));
-  std::string fromBuffer = sarntest::Contents(buffer);
-  EXPECT_EQ(fromBuffer, sink.textM) << "the two sinks disagree";
-  return fromBuffer;
+  EXPECT_EQ(sarntest::Contents(buffer), sink.textM) << "the two sinks disagree";
+  return sink.textM;
 }
 
 TEST(JsonWriteTest, QuotesByTheBareRuleAndEscapesExactly) {

@@ -150,7 +150,6 @@ TEST_F(SarnHashTableTest, NameTableHoldsItsInlineNodesWithoutAllocating) {
   EXPECT_EQ(buckets, 12289u * sizeof(void*)) << "only the bucket array came from the pool";
   table->Put(keysM[3079].c_str(), value);
   EXPECT_EQ(poolM.GetUsedBytes(), buckets + 256);
-  table.reset();
 }
 
 TEST_F(SarnHashTableTest, GlobalNameCacheSharesNamesAndIsRebuilt) {
