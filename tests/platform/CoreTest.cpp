@@ -11,27 +11,23 @@ namespace {
 
 std::atomic<int> destroyedG{0};
 
-class Leaf : public VekCore {
- public:
+struct Leaf : VekCore {
   explicit Leaf(int value = 0) : valueM(value) {}
   ~Leaf() override { ++destroyedG; }
   void Set(int value) { valueM = value; }
   int valueM;
 };
 
-class Branch : public Leaf {
- public:
+struct Branch : Leaf {
   explicit Branch(const ref<Leaf>& child) : Leaf(1), childM(child) {}
   ref<Leaf> childM;
 };
 
-class Throwing : public VekCore {
- public:
+struct Throwing : VekCore {
   explicit Throwing(int) { throw std::runtime_error("no"); }
 };
 
-class CoreTest : public sarntest::PoolTest {
- protected:
+struct CoreTest : sarntest::PoolTest {
   void SetUp() override { destroyedG = 0; }
 };
 

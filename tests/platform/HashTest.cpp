@@ -7,8 +7,7 @@
 
 namespace {
 
-class Value : public VekCore {
- public:
+struct Value : VekCore {
   explicit Value(int n) : nM(n) {}
   int nM;
 };

@@ -74,8 +74,7 @@ typedef SarnHashTable<const char*, VekString, 2, 256, SarnHashTableUtilTemplate<
                       SarnHashTableUtilTemplate<VekString>::DefaultClear>
     SmallTable;
 
-class SarnHashTableTest : public sarntest::PoolTest {
- protected:
+struct SarnHashTableTest : sarntest::PoolTest {
   SarnHashTableTest() {
     for (int i = 0; i < 5000; ++i) keysM.push_back("key" + std::to_string(i));
   }
