@@ -1,14 +1,8 @@
 // Base64 and byte lists on arbitrary text. Byte 0 picks the code set; the rest is the text.
 // Oracles: a text that decodes re-encodes to the same length and decodes again to the same
 // bytes; byte lists match strtol token by token and survive FormatBytes.
-#include <climits>
-#include <cstdint>
-#include <cstdlib>
-#include <cstring>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include <cctype>
+#include "DictFuzzSupport.h"
 
 namespace {
 

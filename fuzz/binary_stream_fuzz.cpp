@@ -3,14 +3,8 @@
 // data) finishes exactly as a plain length-prefix encoder writes the same tree; the
 // varint readers never step outside the input, leave cursor and value alone when they fail, and
 // read back what the writers wrote for the value they found.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
 #include <utility>
-#include <vector>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
@@ -51,10 +45,7 @@ template <class T, class Read, class Write>
 void CheckReader(const uint8_t* data, size_t n, Read read, Write write) {
   const unsigned char* cursor = data;
   T value = T(7);
-  if (!read(&cursor, data + n, &value)) {
-    Require(cursor == data && value == T(7));
-    return;
-  }
+  if (!read(&cursor, data + n, &value)) return Require(cursor == data && value == T(7));
   Require(cursor > data && cursor <= data + n);
   sarn::ProtoBufByteOutputStream out;
   write(value, &out);

@@ -2,16 +2,10 @@
 // zlib's memory comes from a pool; the rest is the stream. Oracles: reading in small pieces
 // gives the same bytes and the same verdict as one large read, a duplicate made after the
 // first read gives the same rest, and the pool gets every byte back.
-#include <cstdint>
 #include <cstdio>
-#include <cstdlib>
-#include <cstring>
 #include <memory>
-#include <string>
 
-#include "vek/VekMempool.h"
-#include "wynbaselib/Gzip.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
@@ -26,9 +20,10 @@ struct Outcome {
   std::string errorM;
 };
 
-void ReadRest(wynbaselib::Bytesource& source, size_t block, Outcome& out) {
+// Reads on to the end (or the cap), or `nReads` times.
+void ReadRest(wynbaselib::Bytesource& source, size_t block, Outcome& out, int nReads = -1) {
   std::string buffer(block, '\0');
-  while (out.textM.size() < kMaxOutput) {
+  for (; nReads != 0 && out.textM.size() < kMaxOutput; --nReads) {
     size_t n = source.Read(&buffer[0], block);
     if (n > block) std::abort();
     if (n == 0) break;
@@ -55,13 +50,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     wynbaselib::InMemoryBytestream chunkedIn(stream);
     wynbaselib::GunzipBytesource chunked(&chunkedIn, isPooled ? &pool : nullptr);
     Outcome small;
-    std::string first(block, '\0');
-    size_t n = chunked.Read(&first[0], block);
-    small.textM.assign(first, 0, n);
+    ReadRest(chunked, block, small, 1);
     std::unique_ptr<wynbaselib::Bytesource> duplicate(chunked.Duplicate());
     Require(duplicate != nullptr);
-    Outcome fromDuplicate;
-    fromDuplicate.textM = small.textM;
+    Outcome fromDuplicate = small;
     ReadRest(*duplicate, block, fromDuplicate);
     ReadRest(chunked, block, small);
 

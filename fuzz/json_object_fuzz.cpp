@@ -17,78 +17,39 @@
 // list element, {} refused), a SUBDICT whose object names another type, lazy members (captured
 // text, not read), a repeated member (the later value here, the first there) and a repeated
 // "type" (the later one names the type here).
-#include <cstdint>
-#include <cstring>
-#include <memory>
-#include <string>
 
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
 using namespace sarn;
-using sarntest::PieceSource;
 using sarntest::Require;
 using sarntest::Str;
 
-// Reads `text` from memory (piece 0) or from a byte source in pieces; "+" and the object written
-// at version 0, or "!" and the message. The byte source must be left unmoved, its two duplicates
-// deleted.
-std::string Read(VekMempool* pool, JsonSarnObject& reader, const std::string& text, size_t piece,
-                 ref<SarnObject>& object) {
-  VekString error;
-  PieceSource::Counters counters;
-  PieceSource source(text, piece, &counters);
-  size_t bytesRead = 0;
-  bool isOk = piece == 0 ? reader.JsonToSarnObject(reinterpret_cast<const unsigned char*>(text.data()),
-                                                   static_cast<int>(text.size()), 0, &object, error)
-                         : reader.JsonToSarnObject(&source, bytesRead, 0, &object, error);
-  Require(isOk == (object != nullptr) && source.GetPosition() == 0 && bytesRead <= text.size() &&
-          counters.nDuplicatedM == (piece == 0 ? 0 : 2) && counters.nDeletedM == counters.nDuplicatedM);
-  return isOk ? "+" + Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), 0)) : "!" + Str(error);
-}
-
 // True when an object of the tree holds a free-form value, a lazy member or a subdict.
 bool HoldsPathDifference(const SarnObject* object) {
-  const StructInfo* info = object->GetStructInfo();
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const FieldInfo& field = info->vFieldInfo[n];
+  return dictfuzz::AnyField(object, [](const SarnObject* o, const FieldInfo& field) {
     const unsigned type = field.dataType;
-    if (field.arity == SARN_ARITY_NONE || (!TraitsOf(type).isHoldingObjects && type != SARN_DATA_TYPE_ANY_DICT)) continue;
-    for (unsigned i = 0; i < FieldAccess::Count(object, field); ++i) {
-      VekCore* value = FieldAccess::ReferenceAt(object, field, i);
-      if (value != nullptr && (type != SARN_DATA_TYPE_KNOWN_DICT || HoldsPathDifference(static_cast<SarnObject*>(value)))) {
-        return true;
-      }
+    bool isOther = type != SARN_DATA_TYPE_KNOWN_DICT && (TraitsOf(type).isHoldingObjects || type == SARN_DATA_TYPE_ANY_DICT);
+    for (unsigned i = 0; isOther && i < FieldAccess::Count(o, field); ++i) {
+      if (FieldAccess::ReferenceAt(o, field, i) != nullptr) return true;
     }
-  }
-  return false;
+    return false;
+  });
 }
 
 // True when a dictionary of the tree repeats a name.
-bool RepeatsName(const DictValue* value) {
-  if (value == nullptr) return false;
-  if (value->kindM == DictValue::KIND_ARRAY) {
-    const auto* array = static_cast<const ArrayValue*>(value);
-    for (unsigned k = 0; k < array->CountValues(); ++k) {
-      if (RepeatsName(array->GetValueAt(k).Get())) return true;
-    }
-  }
-  if (value->kindM != DictValue::KIND_DICTIONARY) return false;
-  const auto* dictionary = static_cast<const Dictionary*>(value);
-  VekStringArray names(nullptr);
-  dictionary->GetSortedNames(names);
-  for (int i = 0; i < names.Count(); ++i) {
-    if (dictionary->CountValues(names[i]) > 1 || RepeatsName(dictionary->Get(names[i]).Get())) return true;
-  }
-  return false;
+bool RepeatsName(const Dictionary& tree) {
+  return dictfuzz::AnyValue(tree, [](const DictValue& value) {
+    const auto& dictionary = static_cast<const Dictionary&>(value);
+    return value.kindM == DictValue::KIND_DICTIONARY &&
+           dictfuzz::AnyName(dictionary, [&](const VekString& name) { return dictionary.CountValues(name) > 1; });
+  });
 }
 
 bool RefusedWhenWritten(const std::string& text) {
-  return text.find("\"invalid\"") != std::string::npos || text.find("\"XXX\"") != std::string::npos ||
-         text.find("\"INVALID_VALUE:") != std::string::npos || text.find("{}") != std::string::npos ||
-         text.find("\\u00") != std::string::npos;
+  return dictfuzz::HoldsUnnamedValue(text) || text.find("\"invalid\"") != std::string::npos ||
+         text.find("{}") != std::string::npos || text.find("\\u00") != std::string::npos;
 }
 
 }  // namespace
@@ -102,12 +63,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   [&] {
     JsonSarnObject reader(&pool);
     ref<SarnObject> object, viaSource, again;
-    const std::string memory = Read(&pool, reader, text, 0, object);
-    Require(Read(&pool, reader, text, piece, viaSource) == memory);
+    const std::string memory = dictfuzz::ReadObject(&pool, reader, text, 0, object);
+    Require(dictfuzz::ReadObject(&pool, reader, text, piece, viaSource) == memory);
     if (!object) return;
-    const std::string written = memory.substr(1);
-    const std::string second = Read(&pool, reader, written, 0, again);
-    Require(again ? second == memory : RefusedWhenWritten(written));
+    const std::string second = dictfuzz::ReadObject(&pool, reader, memory, 0, again);
+    Require(again ? second == memory : RefusedWhenWritten(memory));
 
     VekString treeError;
     ref<Dictionary> tree = Dictionary::FromJson(reinterpret_cast<const unsigned char*>(text.data()), text.size(),
@@ -116,8 +76,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     DictionarySarnObject converter(&pool, Schema::vStructDefG, Schema::nStructDefG);
     ref<SarnObject> viaTree;
     if (!converter.DictionaryToSarnObject(tree, 0, viaTree, treeError)) return;
-    if (HoldsPathDifference(object.Get()) || RepeatsName(tree.Get())) return;
-    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == written);
+    if (HoldsPathDifference(object.Get()) || RepeatsName(*tree)) return;
+    Require(Str(JsonSarnObject(&pool).SarnObjectToJson(viaTree.Get(), 0)) == memory);
   }();
   Require(pool.GetUsedBytes() == 0);  // everything a read made is released with its result
   return 0;

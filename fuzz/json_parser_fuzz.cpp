@@ -7,7 +7,6 @@
 // the writer passes through and the tokenizer then reads differently); where the hand-written
 // reader also accepts the text and it holds no escapes, both trees are equal; no bytes stay in
 // the pool.
-#include <cstring>
 
 #include "DictFuzzSupport.h"
 

@@ -3,12 +3,7 @@
 // both readers succeed on a closed string (or a bare token) they give the same text and stop
 // at the same byte; the two writers give the same bytes; a text without control bytes reads
 // back as itself.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 using sarntest::Require;
 using sarntest::Str;
@@ -46,10 +41,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     sarn::Json::StringToJson(text, (data[-1] & 0x40) != 0, sink);
     Require(sink.textM == std::string(reinterpret_cast<const char*>(buffer.GetData()), buffer.GetLength()));
 
-    bool hasControl = false;
-    for (size_t i = 0; i < size; ++i) hasControl |= data[i] < 0x20 && data[i] != '\b' && data[i] != '\t' &&
-                                                    data[i] != '\n' && data[i] != '\f' && data[i] != '\r';
-    if (!hasControl) {
+    if (!dictfuzz::HasUnicodeEscapedControl(data, size)) {
       sarn::ByteBuffer quoted(&pool);
       sarn::Json::StringToJson(text, false, quoted);
       sarn::InputPointer back(quoted.GetData(), quoted.GetLength());

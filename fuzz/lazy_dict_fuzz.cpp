@@ -4,49 +4,26 @@
 // Oracle: no crash, leak or hang; ToSarnObjectOrError never null; ToProtobuf always reads back as
 // a known dict; the form unchanged but for a type query's switch; and a byte source answers like a
 // JSON payload of the same bytes whenever both JSON readers make the same tree of them.
-#include <cstdint>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
 using namespace sarn;
+using sarntest::PieceSource;
 using sarntest::Require;
 using sarntest::Str;
 
-// Hands out a shared text in pieces; its duplicates start again at the first byte.
-class PieceSource : public wynbaselib::Bytesource {
- public:
-  PieceSource(const std::string& text, size_t piece) : textM(text), pieceM(piece) {}
-  size_t Read(void* buffer, size_t size) override {
-    size_t n = std::min({size, pieceM, textM.size() - atM});
-    std::memcpy(buffer, textM.data() + atM, n);
-    atM += n;
-    return n;
-  }
-  Bytesource* Duplicate() override { return new PieceSource(textM, pieceM); }
-
- private:
-  const std::string& textM;
-  size_t pieceM, atM = 0;
-};
-
 // Everything a payload answers, as text; each form's type queries last, since they may switch it.
 std::string Answers(VekMempool* pool, LazyDict& payload) {
-  ProtoBuf binary(pool, Schema::vStructDefG, Schema::nStructDefG);
   LazyDict::Rep rep = payload.repM;
   VekString error;
   ref<Dictionary> tree = payload.ToDictionary(error);
   std::string out = (tree ? Str(tree->ToJson(false)) : Str(error)) + "|" + Str(payload.ToDict()->ToString(false));
   out += "|" + Str(payload.ToJson(true));
   ref<vek::ByteBuffer> bytes = payload.ToProtobuf();
-  ref<SarnObject> back;
   // Stored protocol-buffer bytes are handed back as they are, read or not.
-  Require(bytes && (rep == LazyDict::REP_PROTOBUF ||
-                    binary.UnmarshalKnownDict(bytes->GetData(), static_cast<int>(bytes->GetLength()), &back)));
-  out += "|" + std::string(reinterpret_cast<const char*>(bytes->GetData()), bytes->GetLength());
+  Require(bytes && (rep == LazyDict::REP_PROTOBUF || sarntest::ReadKnownDict(pool, Str(bytes))));
+  out += "|" + Str(bytes);
   for (bool isDirect : {false, true}) {
     VekFeatures::SetEnabled(548, isDirect);
     ref<SarnObject> object = payload.ToSarnObjectOrError();

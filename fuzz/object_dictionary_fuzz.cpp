@@ -9,36 +9,21 @@
 // And since JSON text never turns a backslash-u escape back into its byte, a control byte inside
 // a value parsed from text (a currency code, say) does not survive: such a text must read back to
 // one that is then stable.
-#include <cstdint>
-#include <cstdlib>
-#include <cstring>
-#include <string>
-#include <vector>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
-using sarntest::Require;
-
 using namespace sarn;
-
-const std::vector<const StructInfo*>& KnownTypes() {
-  static const std::vector<const StructInfo*> types = [] {
-    std::vector<const StructInfo*> out;
-    for (int id = 0; id < Schema::nStructDefG; ++id) {
-      if (Schema::vStructDefG[id] != nullptr) out.push_back(Schema::vStructDefG[id]);
-    }
-    return out;
-  }();
-  return types;
-}
-
+using sarntest::Require;
 using sarntest::Str;
 
-bool HoldsUnnamedValue(const std::string& json) {
-  return json.find("\"INVALID_VALUE:") != std::string::npos || json.find("\"XXX\"") != std::string::npos;
+// The types of the registry, in id order.
+std::vector<const StructInfo*> KnownTypes() {
+  std::vector<const StructInfo*> types;
+  for (int id = 0; id < Schema::nStructDefG; ++id) {
+    if (Schema::vStructDefG[id] != nullptr) types.push_back(Schema::vStructDefG[id]);
+  }
+  return types;
 }
 
 // Null only for a text that holds an unnamed value.
@@ -49,7 +34,7 @@ ref<SarnObject> Read(VekMempool* pool, const std::string& json, KernoVersion ver
   DictionarySarnObject converter(pool, Schema::vStructDefG, Schema::nStructDefG);
   ref<SarnObject> object;
   bool ok = converter.DictionaryToSarnObject(tree, version, object, error);
-  Require(ok || HoldsUnnamedValue(json));
+  Require(ok || dictfuzz::HoldsUnnamedValue(json));
   return object;
 }
 
@@ -64,7 +49,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     ref<Dictionary> tree = Dictionary::FromJson(data + 2, size - 2, error, &pool);
     if (tree == nullptr) return 0;
     if (data[0] != 255) {
-      const StructInfo* type = KnownTypes()[(data[0] * 7u) % KnownTypes().size()];
+      const std::vector<const StructInfo*> types = KnownTypes();
+      const StructInfo* type = types[(data[0] * 7u) % types.size()];
       tree->Remove("type");
       tree->Add(VekString("type"), VekString(type->pName));
     }

@@ -5,49 +5,24 @@
 // or currency left invalid (written as "invalid", which the reader refuses); an envelope reader
 // never returns null; a dictionary that reads writes back to bytes that read to the same text.
 // Standard output (where unknown field numbers are reported) is silenced.
-#include <cstdint>
 #include <cstdio>
-#include <cstdlib>
-#include <string>
 
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
 
 namespace {
 
 using sarntest::Require;
 using sarntest::Finished;
+using sarntest::KnownDictBytes;
 
 // A REQUIRED channel number or currency at INVALID anywhere in the object or the objects it holds.
 bool HoldsInvalidRequired(const sarn::SarnObject* object) {
   using namespace sarn;
-  const StructInfo* info = object != nullptr ? object->GetStructInfo() : nullptr;
-  if (info == nullptr) return false;
-  for (unsigned n = 0; n < info->nFieldInfo; ++n) {
-    const FieldInfo& field = info->vFieldInfo[n];
-    if (field.arity == SARN_ARITY_REQUIRED && field.dataType == SARN_DATA_TYPE_CHANNEL_NUMBER &&
-        FieldAccess::ScalarValue<ChannelNumber>(object, field, 0) == ChannelNumber::INVALID) {
-      return true;
-    }
-    if (field.arity == SARN_ARITY_REQUIRED && field.dataType == SARN_DATA_TYPE_CURRENCY &&
-        FieldAccess::ScalarValue<Currency>(object, field, 0) == Currency::INVALID) {
-      return true;
-    }
-    if (field.arity == SARN_ARITY_NONE ||
-        (field.dataType != SARN_DATA_TYPE_KNOWN_DICT && field.dataType != SARN_DATA_TYPE_SUBDICT)) {
-      continue;
-    }
-    for (unsigned i = 0; i < FieldAccess::Count(object, field); ++i) {
-      if (HoldsInvalidRequired(static_cast<const SarnObject*>(FieldAccess::ReferenceAt(object, field, i)))) return true;
-    }
-  }
-  return false;
-}
-
-std::string Marshal(const sarn::ProtoBuf& codec, const ref<sarn::SarnObject>& object) {
-  sarn::ProtoBufByteOutputStream out;
-  codec.MarshalKnownDict(object.Get(), &out);
-  return Finished(out);
+  return dictfuzz::AnyField(object, [](const SarnObject* o, const FieldInfo& field) {
+    return field.arity == SARN_ARITY_REQUIRED &&
+           ((field.dataType == SARN_DATA_TYPE_CHANNEL_NUMBER && FieldAccess::ScalarValue<ChannelNumber>(o, field, 0) == ChannelNumber::INVALID) ||
+            (field.dataType == SARN_DATA_TYPE_CURRENCY && FieldAccess::ScalarValue<Currency>(o, field, 0) == Currency::INVALID));
+  });
 }
 
 }  // namespace
@@ -67,14 +42,14 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         // form is a fixed point.
         ref<sarn::SarnObject> object;
         if (!codec.UnmarshalKnownDict(input, length, &object)) break;
-        std::string bytes = Marshal(codec, object);
+        std::string bytes = KnownDictBytes(&pool, object.Get());
         ref<sarn::SarnObject> again;
         if (!codec.UnmarshalKnownDict(reinterpret_cast<const unsigned char*>(bytes.data()),
                                       static_cast<int>(bytes.size()), &again)) {
           Require(HoldsInvalidRequired(object.Get()));
           break;
         }
-        Require(Marshal(codec, again) == bytes);
+        Require(KnownDictBytes(&pool, again.Get()) == bytes);
         break;
       }
       case 1:

@@ -1,15 +1,11 @@
 // The message readers. Byte 0: the byte-source reader's setting (low bits, modulo 3) and, in bit
 // 7, whether the rest is a frame as it stands or parts assembled into a frame of the writers'
-// form; bytes 1 and 2: two chunk sizes used in turn. Oracles: the byte-source reader gives the
+// form; bytes 1 and 2: two chunk sizes used in turn (0 for 1). Oracles: the byte-source reader gives the
 // same verdict and message whole and in chunks; on assembled frames what it accepts the string
 // reader accepts too, with the same kind, members, optional headers and body bytes; every
 // accepted wrapper written again reads back equal.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include "sarn/Sarn.h"
-#include "../tests/testutil/TestStreams.h"
+#include "DictFuzzSupport.h"
+#include "RpcFuzzSupport.h"
 
 namespace {
 
@@ -17,10 +13,8 @@ using namespace sarn;
 using sarntest::Require;
 using sarntest::Str;
 
-VekMempool* Pool() {
-  static VekMempool* pool = new VekMempool("rpc_message_fuzz");
-  return pool;
-}
+// Messages may keep their pool's blocks between inputs; one pool lives as long as the process.
+VekMempool* const pPoolG = new VekMempool("rpc_message_fuzz");
 
 // Each own header once, names in byte order, no blanks around a key, and one optional header.
 std::string Assemble(const std::string& rest) {
@@ -49,50 +43,18 @@ std::string Assemble(const std::string& rest) {
   return "MRPC/2 " + std::to_string(block.size()) + " " + std::to_string(parts[7].size()) + "\r\n" + block + parts[7];
 }
 
-std::string BodyBytes(const ref<LazyDict>& body) {
-  if (!body || body->repM != LazyDict::REP_BYTESOURCE) return body ? Str(body->ToJson(false)) : "";
-  wynbaselib::Bytesource* copy = body->pBytesourceM->Duplicate();
-  std::string all(512, '\0');
-  size_t used = 0;
-  for (size_t n; (n = copy->Read(&all[used], all.size() - used)) != 0; all.resize(all.size() * 2)) used += n;
-  delete copy;
-  return all.substr(0, used);
-}
-
-// The kind, typed members, optional headers and (unless parsed) body bytes of a wrapper.
-std::string Summary(const ref<KernoRpcWrapper>& w, bool withBody) {
-  std::string text = Str(w->HeadersToDict(Pool())->ToString(false)) + " v" + std::to_string(w->schemaVersionM);
-  if (auto* q = dynamic_cast<RequestWrapper*>(w.Get())) {
-    text += " ct=" + Str(q->contentTypeM) + (withBody ? " " + BodyBytes(q->bodyM) : "");
-  } else if (auto* r = dynamic_cast<ResponseWrapper*>(w.Get())) {
-    text += " ct=" + Str(r->contentTypeM) + (withBody ? " " + BodyBytes(r->bodyM) : "");
-  }
-  return text;
-}
-
-bool Equal(const ref<KernoRpcWrapper>& a, const ref<KernoRpcWrapper>& b) {
-  if (!b) return false;
-  auto* q = dynamic_cast<RequestWrapper*>(a.Get());
-  auto* r = dynamic_cast<ResponseWrapper*>(a.Get());
-  if (q && dynamic_cast<RequestWrapper*>(b.Get())) return *q == *dynamic_cast<RequestWrapper*>(b.Get());
-  if (r && dynamic_cast<ResponseWrapper*>(b.Get())) return *r == *dynamic_cast<ResponseWrapper*>(b.Get());
-  return a->rpcIdM == b->rpcIdM && a->GetTypeName() == b->GetTypeName();
-}
-
 // Written again and read back by the reader that read it, a wrapper must come back equal.
 // Bodies the payload holds as binary are not written back as they came, and a message read
 // without a Content-Type is written with one (requests) or with an empty one (responses).
 void RequireRoundTrip(const ref<KernoRpcWrapper>& w, int setting) {
-  VekString frame, error;
-  auto* q = dynamic_cast<RequestWrapper*>(w.Get());
-  auto* r = dynamic_cast<ResponseWrapper*>(w.Get());
-  ref<LazyDict> body = q ? q->bodyM : r ? r->bodyM : nullptr;
-  if ((body && body->repM == LazyDict::REP_PROTOBUF) || ((q || r) && (q ? q->contentTypeM : r->contentTypeM).FEmpty())) return;
-  if (!KernoRpcV2::MarshalToString(w, frame, error, Pool(), false)) return;  // a body that writes nothing
-  if (setting < 0) return Require(Equal(w, KernoRpcV2::UnmarshalFromString(Pool(), frame, false, error)));
+  VekString frame, error, contentType = "-";
+  ref<LazyDict> body = rpcfuzz::Body(w, &contentType);
+  if ((body && body->repM == LazyDict::REP_PROTOBUF) || contentType.FEmpty()) return;
+  if (!KernoRpcV2::MarshalToString(w, frame, error, pPoolG, false)) return;  // a body that writes nothing
+  if (setting < 0) return Require(rpcfuzz::SameWrapper(w, KernoRpcV2::UnmarshalFromString(pPoolG, frame, false, error)));
   sarntest::TestSource source({Str(frame)});
   auto laziness = static_cast<KernoRpcV2BytestreamImpl::LazinessSettings>(setting);
-  Require(Equal(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), source, laziness, error)));
+  Require(rpcfuzz::SameWrapper(w, KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, source, laziness, error)));
 }
 
 }  // namespace
@@ -110,13 +72,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   VekString wholeError, chunkError, stringError;
   sarntest::TestSource whole({frame}), pieces(chunks);
-  ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), whole, setting, wholeError);
-  ref<KernoRpcWrapper> again = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(Pool(), pieces, setting, chunkError);
+  ref<KernoRpcWrapper> read = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, whole, setting, wholeError);
+  ref<KernoRpcWrapper> again = KernoRpcV2BytestreamImpl::UnmarshalFromBytesource(pPoolG, pieces, setting, chunkError);
   Require(Str(wholeError) == Str(chunkError) && !read == !again);
-  if (read) Require(Summary(read, true) == Summary(again, true));
-  ref<KernoRpcWrapper> text = KernoRpcV2::UnmarshalFromString(Pool(), VekString::FromUtf8Bytes(Pool(), frame.size(), frame.data()), false, stringError);
+  if (read) Require(rpcfuzz::Describe(pPoolG, read) == rpcfuzz::Describe(pPoolG, again));
+  ref<KernoRpcWrapper> text = KernoRpcV2::UnmarshalFromString(pPoolG, VekString::FromUtf8Bytes(pPoolG, frame.size(), frame.data()), false, stringError);
   if (read && (data[0] & 0x80) != 0) {
-    Require(text && Summary(read, setting != 2) == Summary(text, setting != 2));
+    Require(text && rpcfuzz::Describe(pPoolG, read, setting != 2) == rpcfuzz::Describe(pPoolG, text, setting != 2));
   }
   if (text) RequireRoundTrip(text, -1);
   if (read) RequireRoundTrip(read, setting);

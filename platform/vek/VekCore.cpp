@@ -14,8 +14,9 @@ struct PendingObject {
   VekMempool* pPoolM;
 };
 constexpr int kMaxPendingG = 16;
-thread_local PendingObject vPendingG[kMaxPendingG];
-thread_local int nPendingG = 0;
+// The initial-exec model keeps every counted new and constructor off the general TLS call.
+thread_local PendingObject vPendingG[kMaxPendingG] __attribute__((tls_model("initial-exec")));
+thread_local int nPendingG __attribute__((tls_model("initial-exec"))) = 0;
 
 void PushPending(void* p, VekMempool* pool) {
   if (nPendingG == kMaxPendingG) {

@@ -28,33 +28,6 @@ VekString::VekString(const char* text) : pRepM(nullptr) {
   if (pRepM != nullptr) std::memcpy(pRepM->Data(), text, n);
 }
 
-VekString& VekString::operator=(const VekString& other) {
-  // Take the representation before releasing ours: `other` may be this very string.
-  VekStringRepN* rep = other.pRepM;
-  if (rep != nullptr) rep->refCountM.fetch_add(1, std::memory_order_relaxed);
-  Release();
-  pRepM = rep;
-  return *this;
-}
-
-VekString& VekString::operator=(VekString&& other) noexcept {
-  if (this != &other) {
-    Release();
-    pRepM = other.pRepM;
-    other.pRepM = nullptr;
-  }
-  return *this;
-}
-
-void VekString::Release() {
-  // The sole holder frees without a locked instruction (nobody else can copy it any more).
-  if (pRepM != nullptr && (pRepM->refCountM.load(std::memory_order_acquire) == 1 ||
-                           pRepM->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1)) {
-    pRepM->pMempoolM->Free(pRepM);
-  }
-  pRepM = nullptr;
-}
-
 VekString VekString::FromUtf8Bytes(VekMempool* pool, size_t nByte, const void* bytes) {
   VekString result;
   if (nByte == 0) return result;

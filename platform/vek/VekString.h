@@ -36,8 +36,24 @@ class VekString {
   }
   VekString(VekString&& other) noexcept : pRepM(other.pRepM) { other.pRepM = nullptr; }
   ~VekString() { Release(); }
-  VekString& operator=(const VekString& other);
-  VekString& operator=(VekString&& other) noexcept;
+  // Copies and releases are inline: readers and trees make and drop texts by the million, and a
+  // call into this library for each costs more than the work.
+  VekString& operator=(const VekString& other) {
+    // Take the representation before releasing ours: `other` may be this very string.
+    VekStringRepN* rep = other.pRepM;
+    if (rep != nullptr) rep->refCountM.fetch_add(1, std::memory_order_relaxed);
+    Release();
+    pRepM = rep;
+    return *this;
+  }
+  VekString& operator=(VekString&& other) noexcept {
+    if (this != &other) {
+      Release();
+      pRepM = other.pRepM;
+      other.pRepM = nullptr;
+    }
+    return *this;
+  }
 
   // Copies `nByte` bytes (which may include NUL) into `pool` (null: the default pool).
   static VekString FromUtf8Bytes(VekMempool* pool, size_t nByte, const void* bytes);
@@ -77,7 +93,15 @@ class VekString {
  private:
   static VekStringRepN* NewRep(VekMempool* pool, size_t nByte);
   VekString Slice(long startPos, long endPos) const;
-  void Release();
+  void Release() {
+    // The sole holder frees without a locked instruction (nobody else can copy it any more).
+    VekStringRepN* rep = pRepM;
+    pRepM = nullptr;
+    if (rep != nullptr && (rep->refCountM.load(std::memory_order_acquire) == 1 ||
+                           rep->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1)) {
+      rep->pMempoolM->Free(rep);
+    }
+  }
   VekStringRepN* pRepM;
 };
 static_assert(sizeof(VekString) == sizeof(void*), "VekString is one pointer");

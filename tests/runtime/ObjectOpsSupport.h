@@ -1,12 +1,13 @@
-// Helpers shared by the equality, copy and version-conversion tests: objects from JSON text or
-// from one field's value in a table, a copy through the binary form, and type queries.
+// Helpers shared by the object, message and payload tests: objects from JSON text or from one
+// field's value in a table, a copy through the binary form, type queries, the wrappers' own
+// equality, the bytes left in a byte source, and bytes built from the inside out.
 #pragma once
 
 #include <sstream>
 #include <string>
 
 #include "sarn/Sarn.h"
-#include "testutil/TestStreams.h"
+#include "../fuzz/RpcFuzzSupport.h"
 #include "testutil/TestUtil.h"
 
 namespace objopstest {
@@ -21,6 +22,11 @@ inline ref<SarnObject> FromJson(VekMempool* pool, const std::string& json) {
   ref<Dictionary> tree = Dictionary::FromJson(VekString(json.c_str()), error, pool);
   if (tree) DictionarySarnObject(pool, Schema::vStructDefG, Schema::nStructDefG).DictionaryToSarnObject(tree, 0, object, error);
   return object;
+}
+
+// The object's JSON text at `version`, or "null".
+inline std::string ObjectJson(VekMempool* pool, const ref<SarnObject>& object, KernoVersion version = 0) {
+  return object ? Str(JsonSarnObject(pool).SarnObjectToJson(object.Get(), version)) : "null";
 }
 
 inline ref<SarnObject> BinaryCopy(VekMempool* pool, const SarnObject* object) {
@@ -74,6 +80,29 @@ inline ref<SarnObject> Nest(VekMempool* pool, int depth, const std::string& mess
     inner = outer;
   }
   return inner;
+}
+
+using rpcfuzz::SameWrapper;
+using rpcfuzz::SourceBytes;
+
+// Nested length-prefixed bytes built from the innermost out in linear time: each Prepend puts its
+// bytes in front of everything so far.
+struct InsideOut {
+  explicit InsideOut(const std::string& innermost) : reversedM(innermost.rbegin(), innermost.rend()) {}
+  void Prepend(const std::string& bytes) { reversedM.append(bytes.rbegin(), bytes.rend()); }
+  std::string Bytes() const { return std::string(reversedM.rbegin(), reversedM.rend()); }
+  std::string reversedM;
+};
+
+// The known-dict bytes of `depth` errors of code `code`, each the cause of the next: code (08),
+// text (1A 00), cause (2A) holding the known dict of type 346 (D2 15).
+inline std::string ErrorChainBytes(int depth, char code) {
+  InsideOut bytes(std::string("\xD2\x15\x04\x08", 4) + code + std::string("\x1A\x00", 2));
+  for (int i = 1; i < depth; ++i) {
+    bytes.Prepend(std::string("\x08", 1) + code + std::string("\x1A\x00\x2A", 3) + sarntest::Varint(bytes.reversedM.size()));
+    bytes.Prepend("\xD2\x15" + sarntest::Varint(bytes.reversedM.size()));
+  }
+  return bytes.Bytes();
 }
 
 }  // namespace objopstest

@@ -3,7 +3,6 @@
 // from `stdin` (or nothing), and its standard output, standard error and exit status are compared
 // byte for byte with the files `stdout`, `stderr` and `status` (a missing file means empty, or 0).
 // SARN_UPDATE_GOLDEN=1 writes what the programs did into those files instead, for review.
-#include <dirent.h>
 #include <unistd.h>
 #include <sys/wait.h>
 
@@ -27,11 +26,9 @@ std::string CasesDir() {
 
 std::vector<std::string> CaseNames() {
   std::vector<std::string> names;
-  if (DIR* dir = opendir(CasesDir().c_str())) {
-    while (dirent* entry = readdir(dir)) {
-      if (entry->d_name[0] != '.') names.push_back(entry->d_name);
-    }
-    closedir(dir);
+  std::error_code error;
+  for (const auto& entry : std::filesystem::directory_iterator(CasesDir(), error)) {
+    if (entry.path().filename().string()[0] != '.') names.push_back(entry.path().filename().string());
   }
   std::sort(names.begin(), names.end());
   return names;
@@ -41,15 +38,6 @@ std::string ReadOrEmpty(const std::string& path) {
   std::string text;
   sarntest::ReadFile(path, text);
   return text;
-}
-
-// Writes `text` to `path`, or removes the file when the text is the default (empty).
-void WriteGolden(const std::string& path, const std::string& text) {
-  if (text.empty()) {
-    std::remove(path.c_str());
-    return;
-  }
-  std::ofstream(path, std::ios::binary) << text;
 }
 
 class ToolGolden : public ::testing::TestWithParam<std::string> {};
@@ -63,8 +51,7 @@ TEST_P(ToolGolden, MatchesGoldenFiles) {
   std::string scratchDir = ::testing::TempDir() + "sarn-golden-" + std::to_string(getpid());
   std::filesystem::create_directories(scratchDir);
   std::string scratch = scratchDir + "/" + GetParam();
-  std::string input = dir + "/stdin", unused;
-  if (!sarntest::ReadFile(input, unused)) input = "/dev/null";
+  const std::string input = std::filesystem::exists(dir + "/stdin") ? dir + "/stdin" : "/dev/null";
   // The programs' folders first on PATH; SARN_SOURCE_DIR stays set for scripts that use the tree.
   std::string command = "cd '" + dir + "' && PATH='" + toolDir + "':\"$PATH\" SCRATCH='" + scratch +
                         "' exec sh ./cmd <'" + input + "' >'" + scratch + ".out' 2>'" + scratch + ".err'";
@@ -75,9 +62,11 @@ TEST_P(ToolGolden, MatchesGoldenFiles) {
   std::error_code ignored;
   std::filesystem::remove_all(scratchDir, ignored);
   if (const char* update = std::getenv("SARN_UPDATE_GOLDEN"); update != nullptr && std::string(update) == "1") {
-    WriteGolden(dir + "/stdout", out);
-    WriteGolden(dir + "/stderr", err);
-    WriteGolden(dir + "/status", status == "0\n" ? "" : status);
+    // What the programs did goes into the files, a default (empty, status 0) as no file.
+    for (const auto& [name, text] : {std::pair<std::string, std::string>{"stdout", out}, {"stderr", err}, {"status", status == "0\n" ? "" : status}}) {
+      if (text.empty()) std::remove((dir + "/" + name).c_str());
+      else std::ofstream(dir + "/" + name, std::ios::binary) << text;
+    }
     return;
   }
   std::string wantStatus = ReadOrEmpty(dir + "/status");

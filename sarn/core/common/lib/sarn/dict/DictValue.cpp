@@ -127,15 +127,16 @@ class TreeWriter {
   template <class Out>
   static void Object(const Dictionary& dictionary, Out& out, JsonFormat format) {
     // The sorted order lives on the stack for the small objects that dominate; a larger one
-    // borrows a block of the dictionary's pool for the duration of the write. Without that
-    // block the names are picked one at a time instead: the same bytes, in quadratic time.
+    // borrows a block of the dictionary's pool for the duration of the write, with as much
+    // again for sorting. Without that block the names are picked one at a time instead: the
+    // same bytes, in quadratic time.
     Dictionary::SortKey local[16];
     Dictionary::SortKey* order = local;
     if (dictionary.nNameM > 16) {
       order = static_cast<Dictionary::SortKey*>(
-          dictionary.GetMempool()->Malloc(sizeof(Dictionary::SortKey) * dictionary.nNameM));
+          dictionary.GetMempool()->Malloc(sizeof(Dictionary::SortKey) * dictionary.nNameM * size_t{2}));
     }
-    if (order != nullptr) dictionary.SortedFirsts(order);
+    if (order != nullptr) dictionary.SortedFirsts(order, order != local ? order + dictionary.nNameM : nullptr);
     out.Put('{');
     ++format.depthM;
     int32_t first = -1;

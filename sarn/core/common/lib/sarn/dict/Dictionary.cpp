@@ -22,8 +22,9 @@ using internal::TreeWalk;
 
 namespace {
 
-constexpr uint32_t kLinearNames = 8;
+constexpr uint32_t kLinearNames = 16;
 constexpr uint32_t kFirstIndexSlots = 32;
+constexpr uint32_t kRadixSortNames = 256;
 
 uint64_t HashSeed() {
   static const uint64_t seed = [] {
@@ -87,17 +88,20 @@ ref<Dictionary> Dictionary::New(VekMempool* pool, const VekString& typeName) {
   return dictionary;
 }
 
-int32_t Dictionary::FindFirst(const char* name, size_t nByte) const {
+int32_t Dictionary::FindFirst(const char* name, size_t nByte, uint64_t* pHash) const {
   if (vIndexM == nullptr) {
+    if (pHash != nullptr) *pHash = kNoHash;
     for (uint32_t i = 0; i < nEntryM; ++i) {
       if (NameIs(vEntryM[i].nameM, name, nByte)) return static_cast<int32_t>(i);
     }
     return -1;
   }
-  for (uint32_t slot = HashName(name, nByte) & indexMaskM;; slot = (slot + 1) & indexMaskM) {
-    int32_t entry = vIndexM[slot] - 1;
+  uint32_t hash = HashName(name, nByte);
+  if (pHash != nullptr) *pHash = hash;
+  for (uint32_t slot = hash & indexMaskM;; slot = (slot + 1) & indexMaskM) {
+    int32_t entry = vIndexM[slot].entryM - 1;
     if (entry < 0) return -1;
-    if (NameIs(vEntryM[entry].nameM, name, nByte)) return entry;
+    if (vIndexM[slot].hashM == hash && NameIs(vEntryM[entry].nameM, name, nByte)) return entry;
   }
 }
 
@@ -109,7 +113,7 @@ unsigned Dictionary::CountOf(int32_t first) const {
 bool Dictionary::GrowEntries() {
   if (nEntryM < capacityM) return true;
   if (capacityM >= 0x40000000u) return false;
-  uint32_t capacity = capacityM == 0 ? 4 : capacityM * 2;
+  uint32_t capacity = capacityM == 0 ? 2 : capacityM < 8 ? capacityM * 2 : capacityM + capacityM / 2;
   Entry* entries = static_cast<Entry*>(pMempoolM->Malloc(sizeof(Entry) * capacity));
   if (entries == nullptr) return false;
   for (uint32_t i = 0; i < nEntryM; ++i) {
@@ -123,26 +127,34 @@ bool Dictionary::GrowEntries() {
   return true;
 }
 
-void Dictionary::IndexInsert(int32_t entry) {
-  const VekString& name = vEntryM[entry].nameM;
-  uint32_t slot = HashName(name.Utf8(), name.NByte()) & indexMaskM;
-  while (vIndexM[slot] != 0) slot = (slot + 1) & indexMaskM;
-  vIndexM[slot] = entry + 1;
+void Dictionary::IndexInsert(int32_t entry, uint32_t hash) {
+  uint32_t slot = hash & indexMaskM;
+  while (vIndexM[slot].entryM != 0) slot = (slot + 1) & indexMaskM;
+  vIndexM[slot] = IndexSlot{hash, entry + 1};
 }
 
 bool Dictionary::RebuildIndex(uint32_t nSlot) {
-  int32_t* index = static_cast<int32_t*>(pMempoolM->Calloc(nSlot, sizeof(int32_t)));
+  IndexSlot* index = static_cast<IndexSlot*>(pMempoolM->Calloc(nSlot, sizeof(IndexSlot)));
   if (index == nullptr) return false;
-  pMempoolM->Free(vIndexM);
+  IndexSlot* old = vIndexM;
+  uint32_t nOldSlot = old != nullptr ? indexMaskM + 1 : 0;
   vIndexM = index;
   indexMaskM = nSlot - 1;
+  if (old != nullptr) {
+    for (uint32_t i = 0; i < nOldSlot; ++i) {
+      if (old[i].entryM != 0) IndexInsert(old[i].entryM - 1, old[i].hashM);
+    }
+    pMempoolM->Free(old);
+    return true;
+  }
   for (uint32_t i = 0; i < nEntryM; ++i) {
-    if (vEntryM[i].lastOrOrdinalM >= 0) IndexInsert(static_cast<int32_t>(i));
+    const VekString& name = vEntryM[i].nameM;
+    if (vEntryM[i].lastOrOrdinalM >= 0) IndexInsert(static_cast<int32_t>(i), HashName(name.Utf8(), name.NByte()));
   }
   return true;
 }
 
-bool Dictionary::AppendNewName(VekString&& name, DictValue* value) {
+bool Dictionary::AppendNewName(VekString&& name, DictValue* value, uint64_t hash) {
   if (!GrowEntries()) return false;
   // Keep the index at most half full; without one, build it once the scan gets long.
   if (vIndexM != nullptr ? (nNameM + 1) * 2 > indexMaskM + 1 : nNameM + 1 > kLinearNames) {
@@ -153,7 +165,10 @@ bool Dictionary::AppendNewName(VekString&& name, DictValue* value) {
   new (&vEntryM[entry]) Entry{static_cast<VekString&&>(name), value, -1, entry};
   ++nEntryM;
   ++nNameM;
-  if (vIndexM != nullptr) IndexInsert(entry);
+  if (vIndexM != nullptr) {
+    const VekString& added = vEntryM[entry].nameM;
+    IndexInsert(entry, hash != kNoHash ? static_cast<uint32_t>(hash) : HashName(added.Utf8(), added.NByte()));
+  }
   return true;
 }
 
@@ -169,9 +184,10 @@ bool Dictionary::AppendToName(int32_t first, DictValue* value) {
 }
 
 bool Dictionary::AppendAny(const VekString& name, DictValue* value) {
-  int32_t first = FindFirst(name.Utf8(), name.NByte());
+  uint64_t hash;
+  int32_t first = FindFirst(name.Utf8(), name.NByte(), &hash);
   if (first >= 0) return AppendToName(first, value);
-  return AppendNewName(VekString(name), value);
+  return AppendNewName(VekString(name), value, hash);
 }
 
 bool Dictionary::Add(const VekString& name, const ref<DictValue>& value) {
@@ -246,7 +262,7 @@ void Dictionary::GetSortedNames(VekStringArray& out) const {
   out.Sort();
 }
 
-void Dictionary::SortedFirsts(SortKey* out) const {
+void Dictionary::SortedFirsts(SortKey* out, SortKey* scratch) const {
   uint32_t n = 0;
   for (uint32_t i = 0; i < nEntryM; ++i) {
     if (vEntryM[i].lastOrOrdinalM < 0) continue;
@@ -275,8 +291,39 @@ void Dictionary::SortedFirsts(SortKey* out) const {
       for (; j > 0 && less(moving, out[j - 1]); --j) out[j] = out[j - 1];
       out[j] = moving;
     }
-  } else {
+    return;
+  }
+  if (scratch == nullptr || n < kRadixSortNames) {
     std::sort(out, out + n, less);
+    return;
+  }
+  // Many names: a stable radix sort on the prefixes, a pass for each byte that differs at all,
+  // then the runs of equal prefixes by their whole names. Comparison sorts fall to their slow
+  // paths on the names of wide objects ("k1", "k10", "k100", ...) and compare far more often.
+  uint32_t counts[8][256] = {};
+  for (uint32_t i = 0; i < n; ++i) {
+    for (int b = 0; b < 8; ++b) ++counts[b][(out[i].prefixM >> (8 * b)) & 0xFF];
+  }
+  SortKey* from = out;
+  SortKey* to = scratch;
+  for (int b = 0; b < 8; ++b) {
+    uint32_t* count = counts[b];
+    if (count[(from[0].prefixM >> (8 * b)) & 0xFF] == n) continue;  // the same byte in every prefix
+    uint32_t at = 0;
+    for (int v = 0; v < 256; ++v) {
+      uint32_t c = count[v];
+      count[v] = at;
+      at += c;
+    }
+    for (uint32_t i = 0; i < n; ++i) to[count[(from[i].prefixM >> (8 * b)) & 0xFF]++] = from[i];
+    std::swap(from, to);
+  }
+  if (from != out) std::memcpy(out, from, sizeof(SortKey) * n);
+  for (uint32_t i = 0; i < n;) {
+    uint32_t j = i + 1;
+    while (j < n && out[j].prefixM == out[i].prefixM) ++j;
+    if (j - i > 1) std::sort(out + i, out + j, less);
+    i = j;
   }
 }
 
@@ -287,7 +334,7 @@ bool Dictionary::Remove(const VekString& name) {
   uint32_t nOld = nEntryM;
   nEntryM = 0;
   nNameM = 0;
-  if (vIndexM != nullptr) std::memset(vIndexM, 0, (indexMaskM + 1u) * sizeof(int32_t));
+  if (vIndexM != nullptr) std::memset(vIndexM, 0, (indexMaskM + 1u) * sizeof(IndexSlot));
   for (uint32_t i = 0; i < nOld; ++i) {
     Entry& e = vEntryM[i];
     if (NameIs(e.nameM, name.Utf8(), name.NByte())) {
@@ -302,12 +349,13 @@ bool Dictionary::Remove(const VekString& name) {
     }
     Entry& kept = vEntryM[entry];
     kept.nextM = -1;
-    int32_t first = FindFirst(kept.nameM.Utf8(), kept.nameM.NByte());  // among the entries kept so far
+    uint64_t hash;
+    int32_t first = FindFirst(kept.nameM.Utf8(), kept.nameM.NByte(), &hash);  // among the entries kept so far
     ++nEntryM;
     if (first < 0) {
       kept.lastOrOrdinalM = entry;
       ++nNameM;
-      if (vIndexM != nullptr) IndexInsert(entry);
+      if (vIndexM != nullptr) IndexInsert(entry, static_cast<uint32_t>(hash));
     } else {
       kept.lastOrOrdinalM = -static_cast<int32_t>(CountOf(first));
       vEntryM[vEntryM[first].lastOrOrdinalM].nextM = entry;

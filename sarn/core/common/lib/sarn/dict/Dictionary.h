@@ -130,16 +130,19 @@ class SARN_EXPORT Dictionary : public DictValue {
     int32_t lastOrOrdinalM;
   };
 
-  int32_t FindFirst(const char* name, size_t nByte) const;
+  // With an index, FindFirst also gives the name's hash through `pHash` (kNoHash without one), so
+  // that an append that follows does not hash the name again.
+  static constexpr uint64_t kNoHash = ~uint64_t{0};
+  int32_t FindFirst(const char* name, size_t nByte, uint64_t* pHash = nullptr) const;
   unsigned CountOf(int32_t first) const;
   // Append an entry, taking over one reference to `value` on success (on failure the caller
   // still owns it). AppendNewName is for a name known to be absent and takes over `name`.
-  bool AppendNewName(VekString&& name, DictValue* value);
+  bool AppendNewName(VekString&& name, DictValue* value, uint64_t hash = kNoHash);
   bool AppendToName(int32_t first, DictValue* value);
   bool AppendAny(const VekString& name, DictValue* value);
   bool GrowEntries();
   bool RebuildIndex(uint32_t nSlot);
-  void IndexInsert(int32_t entry);
+  void IndexInsert(int32_t entry, uint32_t hash);
   // The first entry of every name in byte order of the names, into `out` (nNameM slots). The
   // leading eight bytes of each name, read as a big-endian number, decide most comparisons
   // without touching the name again.
@@ -147,7 +150,9 @@ class SARN_EXPORT Dictionary : public DictValue {
     uint64_t prefixM;
     int32_t entryM;
   };
-  void SortedFirsts(SortKey* out) const;
+  // The first entries of the names in name order, into `out` (room for every name). `scratch`,
+  // room for as many again or null, lets a large dictionary be sorted in linear time.
+  void SortedFirsts(SortKey* out, SortKey* scratch) const;
   bool EqualsDictionary(const Dictionary& other) const;
   friend class internal::TreeWalk;
   friend class TreeWriter;
@@ -157,7 +162,13 @@ class SARN_EXPORT Dictionary : public DictValue {
   uint32_t capacityM;
   uint32_t nNameM;
   uint32_t indexMaskM;  // slots - 1, or 0 while there is no index
-  int32_t* vIndexM;     // entry index + 1 of the first entry of a name; 0 marks an empty slot
+  // A slot keeps the name's hash beside its entry: probes compare hashes before they touch an
+  // entry's name, and growing the index never hashes a name again.
+  struct IndexSlot {
+    uint32_t hashM;
+    int32_t entryM;  // entry index + 1 of the first entry of a name; 0 marks an empty slot
+  };
+  IndexSlot* vIndexM;
   DictValue* pNextReleaseM;
 };
 

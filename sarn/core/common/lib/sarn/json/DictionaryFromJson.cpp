@@ -18,6 +18,7 @@
 #include "sarn/dict/Dictionary.h"
 #include "sarn/values/Json.h"
 #include "sarn/json/internal/JsonReadSupport.h"
+#include "sarn/json/internal/JsonTokenScan.h"
 
 namespace sarn {
 
@@ -53,7 +54,10 @@ inline CursorByte* AsCursor(const Byte* p) { return reinterpret_cast<CursorByte*
 
 struct Frame {
   DictValue* pContainerM;  // owned by the tree
-  VekString keyM;          // object: the key of the member being read
+  // Object: the text of the key of the member being read, only for failure messages. Not a
+  // counted copy (two locked instructions per member): the reader's current key holds it until
+  // the member is added, and from then on the container's entry does, for the whole read.
+  const char* pKeyM;
   uint32_t indexM;         // array: the index of the element being read
   bool isObjectM;
 };
@@ -64,7 +68,6 @@ class FrameStack {
   explicit FrameStack(VekMempool* pool)
       : pMempoolM(pool), vFrameM(reinterpret_cast<Frame*>(vInlineM)), nFrameM(0), capacityM(kInline) {}
   ~FrameStack() {
-    for (uint32_t i = 0; i < nFrameM; ++i) vFrameM[i].~Frame();
     if (!IsInline()) pMempoolM->Free(vFrameM);
   }
   FrameStack(const FrameStack&) = delete;
@@ -72,10 +75,10 @@ class FrameStack {
 
   bool Push(DictValue* container, bool isObject) {
     if (nFrameM == capacityM && !Grow()) return false;
-    new (&vFrameM[nFrameM++]) Frame{container, VekString(), 0, isObject};
+    vFrameM[nFrameM++] = Frame{container, "", 0, isObject};
     return true;
   }
-  void Pop() { vFrameM[--nFrameM].~Frame(); }
+  void Pop() { --nFrameM; }
   Frame& Top() { return vFrameM[nFrameM - 1]; }
   Frame& At(uint32_t i) { return vFrameM[i]; }
   uint32_t Count() const { return nFrameM; }
@@ -86,11 +89,7 @@ class FrameStack {
   bool Grow() {
     Frame* frames = static_cast<Frame*>(pMempoolM->Malloc(sizeof(Frame) * capacityM * 2));
     if (frames == nullptr) return false;
-    for (uint32_t i = 0; i < nFrameM; ++i) {
-      new (&frames[i]) Frame{vFrameM[i].pContainerM, static_cast<VekString&&>(vFrameM[i].keyM), vFrameM[i].indexM,
-                             vFrameM[i].isObjectM};
-      vFrameM[i].~Frame();
-    }
+    std::memcpy(frames, vFrameM, sizeof(Frame) * nFrameM);
     if (!IsInline()) pMempoolM->Free(vFrameM);
     vFrameM = frames;
     capacityM *= 2;
@@ -146,8 +145,7 @@ class HandReader {
 bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text) {
   const Byte* start = p;
   if (*p == '"') {
-    const Byte* q = p + 1;
-    while (q < end && *q != '"' && *q != '\\' && *q != 0) ++q;
+    const Byte* q = internal::QuotedRunEnd(p + 1, end);
     if (q < end && *q == '"') {
       size_t n = static_cast<size_t>(q - start - 1);
       text = isKey ? supportM.Key(reinterpret_cast<const char*>(start + 1), n)
@@ -223,12 +221,12 @@ bool HandReader::Fail(const char* message, const VekString& tail, bool isScalar,
   text.AppendString(message);
   text.AppendString(tail.Utf8());
   if (isScalar) text.AppendString(framesM.Top().isObjectM ? " for Object field " : " for Array element.");
-  if (isScalar && framesM.Top().isObjectM) text.AppendString(framesM.Top().keyM.Utf8());
+  if (isScalar && framesM.Top().isObjectM) text.AppendString(framesM.Top().pKeyM);
   for (uint32_t i = nFrame; i-- > 0;) {
     Frame& frame = framesM.At(i);
     if (frame.isObjectM) {
       text.AppendString(" Failed to parse value for key ");
-      text.AppendString(frame.keyM.Utf8());
+      text.AppendString(frame.pKeyM);
     } else {
       text.AppendString(frame.indexM == 0 ? " Failed to parse an array element." : " Failed to parse an array member.");
     }
@@ -245,6 +243,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
   int depth = rootDepth;
   Step step = OPEN;
   VekString key;
+  uint64_t keyHash = 0;  // set by the duplicate check of each key
   bool isOk = true;
   for (;;) {
     Frame& frame = framesM.Top();
@@ -293,7 +292,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         isOk = FailOwn(wasOutOfMemoryM ? kOutOfMemoryMessage : "Failed to parse a Dictionary key.");
         break;
       }
-      if (JsonReadSupport::Has(*static_cast<Dictionary*>(frame.pContainerM), key.Utf8(), key.NByte())) {
+      if (JsonReadSupport::Has(*static_cast<Dictionary*>(frame.pContainerM), key.Utf8(), key.NByte(), keyHash)) {
         isOk = FailOwn("Duplicate key: ", key);
         break;
       }
@@ -303,7 +302,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         break;
       }
       p = SkipWhitespace(p + 1, end);
-      frame.keyM = key;
+      frame.pKeyM = key.Utf8();
     } else {
       frame.indexM = static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Count();
       if (frame.indexM >= kMaxValuesPerContainer) {
@@ -335,7 +334,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
       p = AsBytes(input.pCurM);
     }
     bool isAdded = frame.isObjectM ? JsonReadSupport::AddNew(*static_cast<Dictionary*>(frame.pContainerM),
-                                                             static_cast<VekString&&>(key), value)
+                                                             static_cast<VekString&&>(key), value, keyHash)
                                    : static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Add(value);
     if (!isAdded) {
       delete value;

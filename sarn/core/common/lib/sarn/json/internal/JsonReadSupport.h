@@ -30,13 +30,14 @@ class JsonReadSupport {
   }
 
   // Dictionary access for the readers: lookups by bytes and appends that skip a second lookup.
-  static bool Has(const Dictionary& dictionary, const char* name, size_t n) {
-    return dictionary.FindFirst(name, n) >= 0;
+  // `hash` is for the AddNew that follows, on the same dictionary.
+  static bool Has(const Dictionary& dictionary, const char* name, size_t n, uint64_t& hash) {
+    return dictionary.FindFirst(name, n, &hash) >= 0;
   }
   // For a name known to be absent. The dictionary takes a reference to `value` on success; on
   // failure nothing changes (a fresh node is then the caller's to delete).
-  static bool AddNew(Dictionary& dictionary, VekString&& name, DictValue* value) {
-    if (!dictionary.AppendNewName(static_cast<VekString&&>(name), value)) return false;
+  static bool AddNew(Dictionary& dictionary, VekString&& name, DictValue* value, uint64_t hash) {
+    if (!dictionary.AppendNewName(static_cast<VekString&&>(name), value, hash)) return false;
     value->UpRef();
     return true;
   }
