@@ -7,8 +7,7 @@
 
 namespace {
 
-class Item : public VekCore {
- public:
+struct Item : VekCore {
   explicit Item(int id) : idM(id) {}
   int idM;
 };

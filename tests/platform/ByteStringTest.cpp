@@ -41,8 +41,7 @@ TEST_F(ByteStringTest, ByteBufferAppendsToExactlyTheNewLength) {
 }
 
 // A derived class reaches the storage and grows it with Realloc.
-class GrowingBuffer : public vek::ByteBuffer {
- public:
+struct GrowingBuffer : vek::ByteBuffer {
   explicit GrowingBuffer(VekMempool* pool) : vek::ByteBuffer(pool) {}
   bool Reserve(int k) { return bytesM.Realloc(k); }
   void Push(unsigned char byte) { bytesM.pDataM[bytesM.lengthM++] = byte; }

@@ -11,27 +11,23 @@ namespace {
 
 std::atomic<int> destroyedG{0};
 
-class Leaf : public VekCore {
- public:
+struct Leaf : VekCore {
   explicit Leaf(int value = 0) : valueM(value) {}
   ~Leaf() override { ++destroyedG; }
   void Set(int value) { valueM = value; }
   int valueM;
 };
 
-class Branch : public Leaf {
- public:
+struct Branch : Leaf {
   explicit Branch(const ref<Leaf>& child) : Leaf(1), childM(child) {}
   ref<Leaf> childM;
 };
 
-class Throwing : public VekCore {
- public:
+struct Throwing : VekCore {
   explicit Throwing(int) { throw std::runtime_error("no"); }
 };
 
-class CoreTest : public sarntest::PoolTest {
- protected:
+struct CoreTest : sarntest::PoolTest {
   void SetUp() override { destroyedG = 0; }
 };
 
@@ -118,8 +114,7 @@ TEST_F(CoreTest, ConcurrentUpAndDownRefsAreExact) {
   std::thread releaser([&] {
     for (int i = 0; i < kObjects; ++i) {
       Leaf* p;
-      while ((p = handOff.exchange(nullptr)) == nullptr) {
-      }
+      while ((p = handOff.exchange(nullptr)) == nullptr) {}
       p->DownRef();
     }
   });
@@ -127,8 +122,7 @@ TEST_F(CoreTest, ConcurrentUpAndDownRefsAreExact) {
     Leaf* p = new (&poolM) Leaf;
     p->UpRef();
     p->UpRef();
-    while (handOff.load() != nullptr) {
-    }
+    while (handOff.load() != nullptr) {}
     handOff.store(p);
     p->DownRef();
   }

@@ -42,13 +42,10 @@ struct Gunzipped {
   std::string errorM;
 };
 
-Gunzipped Gunzip(const std::string& compressed, size_t block, VekMempool* pool = nullptr) {
+Gunzipped Gunzip(const std::string& compressed, size_t block) {
   InMemoryBytestream in(compressed);
-  GunzipBytesource source(&in, pool);
-  Gunzipped result;
-  result.textM = ReadAll(source, block);
-  result.isErrorM = source.FError();
-  result.errorM = source.GetErrorText();
+  GunzipBytesource source(&in);
+  Gunzipped result{ReadAll(source, block), source.FError(), source.GetErrorText()};  // in this order
   char c;
   EXPECT_EQ(source.Read(&c, 1), 0u) << "stays at its end";
   return result;

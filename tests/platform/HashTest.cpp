@@ -7,8 +7,7 @@
 
 namespace {
 
-class Value : public VekCore {
- public:
+struct Value : VekCore {
   explicit Value(int n) : nM(n) {}
   int nM;
 };
@@ -38,8 +37,7 @@ TEST_F(HashTest, GrowthKeepsEveryEntryAndForEachVisitsEachOnce) {
   VekHashStringToStringNew table(&poolM);
   constexpr int kEntries = 5000;
   for (int i = 0; i < kEntries; ++i) {
-    std::string k = "key" + std::to_string(i);
-    ASSERT_TRUE(table.Put(Key(&poolM, k), Key(&poolM, "value" + std::to_string(i))));
+    ASSERT_TRUE(table.Put(Key(&poolM, "key" + std::to_string(i)), Key(&poolM, "value" + std::to_string(i)))) << i;
   }
   EXPECT_EQ(table.Count(), static_cast<size_t>(kEntries));
   for (int i = 0; i < kEntries; i += 7) {

@@ -87,8 +87,7 @@ TEST_F(MempoolTest, AccountingIsExactAcrossThreads) {
   // allocating and freeing more at the same time.
   std::atomic<bool> go{false};
   auto churn = [&](std::vector<void*>& blocks, int salt) {
-    while (!go.load()) {
-    }
+    while (!go.load()) {}
     for (int i = 0; i < kRounds; ++i) {
       void* p = poolM.Malloc(static_cast<size_t>((i * salt) % 520));
       poolM.Free(blocks[i]);

@@ -97,9 +97,8 @@ TEST_F(StringTest, CopiesShareOneRepresentationAcrossThreads) {
 
 TEST_F(StringTest, ArrayHoldsAtMost65535StringsAndSorts) {
   VekStringArray array(&poolM);
-  VekString b = VekString::FromUtf8Bytes(&poolM, 1, "b");
-  VekString ab = VekString::FromUtf8Bytes(&poolM, 2, "ab");
-  VekString a = VekString::FromUtf8Bytes(&poolM, 2, "a\0");
+  VekString b = VekString::FromUtf8Bytes(&poolM, 1, "b"), ab = VekString::FromUtf8Bytes(&poolM, 2, "ab"),
+            a = VekString::FromUtf8Bytes(&poolM, 2, "a\0");
   auto joined = [&array] {
     std::string text;
     for (int i = 0; i < array.Count(); ++i) text += Str(array[i]) + "|";

@@ -19,15 +19,9 @@ namespace {
 
 constexpr unsigned kTestAllTypes = 1259;
 
-std::string CompactJson(const DictValue& value) {
-  ByteBuffer out(value.GetMempool());
-  value.ToJson(out, JsonFormat(false));
-  return sarntest::Contents(out);
-}
+std::string CompactJson(const DictValue& value) { return Str(value.ToJson(false)); }
 
-std::string ObjectJson(const SarnObject* object) {
-  return Str(JsonSarnObject(object->GetMempool()).SarnObjectToJson(object, 0));
-}
+std::string ObjectJson(const SarnObject* object) { return Str(JsonSarnObject(object->GetMempool()).SarnObjectToJson(object, 0)); }
 
 // The inputs every row reads: one object with every field set, and its other forms. They live in
 // the swept pool, made before the sweep, so the pool's figures include them from the start.

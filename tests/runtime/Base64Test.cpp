@@ -9,8 +9,7 @@ using Base64Test = sarntest::PoolTest;
 
 using sarntest::Str;
 
-class Base64Pool : public Base64Test {
- protected:
+struct Base64Pool : Base64Test {
   ref<vek::ByteBuffer> Bytes(const std::string& text) { return vek::ByteBuffer::New(&poolM, text.data(), text.size()); }
   VekString Text(const std::string& text) { return VekString::FromUtf8Bytes(&poolM, text.size(), text.data()); }
   std::string Encode(const std::string& bytes) { return Str(sarn::EncodeBase64(&poolM, Bytes(bytes))); }

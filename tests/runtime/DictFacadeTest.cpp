@@ -144,8 +144,7 @@ TEST_F(DictFacadeTest, ComparesByFacadeByTreeAndByText) {
   // Payloads compare by identity through the facade, by content through the tree; a dictionary
   // never equals a payload.
   ref<LazyDict> payload = LazyDict::FromJsonString(&poolM, VekString("{}"), 0);
-  std::vector<ref<Dict>> p;
-  for (int i = 0; i < 4; ++i) p.push_back(MakeDict(&poolM));
+  std::vector<ref<Dict>> p = {MakeDict(&poolM), MakeDict(&poolM), MakeDict(&poolM), MakeDict(&poolM)};
   p[0]->AddLazyDict("l", payload);
   p[1]->AddLazyDict("l", payload);
   p[2]->AddLazyDict("l", LazyDict::FromJsonString(&poolM, VekString("{}"), 0));

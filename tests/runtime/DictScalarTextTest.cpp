@@ -18,8 +18,7 @@ std::string PrintfFloat(double value) {
   char text[100];
   std::snprintf(text, sizeof text, "%1.8g", value);
   std::string result = text;
-  if (result.find('.') == std::string::npos) result += ".0";
-  return result;
+  return result.find('.') == std::string::npos ? result + ".0" : result;
 }
 
 TEST(DictFormatTest, Floats) {
@@ -53,11 +52,8 @@ TEST(DictFormatTest, IntegersAndBooleans) {
   std::mt19937_64 random(7);
   for (int i = 0; i < 5000; ++i) {
     long long value = static_cast<long long>(random()) >> (random() & 63);
-    char text[32];
-    std::snprintf(text, sizeof text, "%lld", value);
-    ASSERT_EQ(Str(Dict::FormatS64(nullptr, value)), text);
-    std::snprintf(text, sizeof text, "%llu", static_cast<unsigned long long>(value));
-    ASSERT_EQ(Str(Dict::FormatU64(nullptr, static_cast<unsigned long long>(value))), text);
+    ASSERT_EQ(Str(Dict::FormatS64(nullptr, value)), std::to_string(value));
+    ASSERT_EQ(Str(Dict::FormatU64(nullptr, static_cast<unsigned long long>(value))), std::to_string(static_cast<unsigned long long>(value)));
   }
 }
 

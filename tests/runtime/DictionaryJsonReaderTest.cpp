@@ -27,9 +27,7 @@ TEST_F(DictionaryJsonReaderTest, AcceptsTolerantShapesAndRefusesWithMessages) {
 
 // The member entry points read one piece and append their words to what the inner step said.
 TEST_F(DictionaryJsonReaderTest, MemberEntryPointsReadOnePiece) {
-  auto cursor = [](const std::string& text) {
-    return InputPointer(reinterpret_cast<const unsigned char*>(text.data()), text.size());
-  };
+  auto cursor = [](const std::string& text) { return InputPointer(reinterpret_cast<const unsigned char*>(text.data()), text.size()); };
   std::string text = " [1, {\"k\": x}] rest";
   InputPointer input = cursor(text);
   ref<Dictionary> d = new (&poolM) Dictionary();

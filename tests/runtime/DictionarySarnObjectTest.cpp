@@ -223,9 +223,7 @@ TEST_F(DictionaryObjectTest, DeepObjectsBecomeDeepTrees) {
     if (i > 0) static_cast<sarnschema::Error*>(chain[i - 1].Get())->causeM = chain.back();
   }
   int levels = 0;
-  for (ref<Dictionary> d = converterM.SarnObjectToDictionary(chain.front().Get(), 0); d; d = d->GetDictionary("cause")) {
-    ++levels;
-  }
+  for (ref<Dictionary> d = converterM.SarnObjectToDictionary(chain.front().Get(), 0); d; d = d->GetDictionary("cause")) ++levels;
   EXPECT_EQ(levels, kDepth);
   for (auto& link : chain) link.Reset();  // from the top, so that no destructor recurses
 }

@@ -14,11 +14,8 @@ std::string Kinds(const ref<ArrayValue>& array) {
   std::string kinds;
   for (unsigned i = 0; i < array->CountValues(); ++i) {
     ref<DictValue> value = array->GetValueAt(i);
-    if (value->kindM == DictValue::KIND_STRING) {
-      kinds += static_cast<StringValue*>(value.Get())->needQuotesM ? "q" : "b";
-    } else {
-      kinds += value->kindM == DictValue::KIND_NULL ? "n" : "?";
-    }
+    bool isString = value->kindM == DictValue::KIND_STRING;
+    kinds += isString ? (static_cast<StringValue*>(value.Get())->needQuotesM ? "q" : "b") : value->kindM == DictValue::KIND_NULL ? "n" : "?";
   }
   return kinds;
 }
@@ -118,7 +115,13 @@ TEST_F(JsonParserTest, ReadsWholeByteSourcesAndDeletesThem) {
   }
 }
 
-TEST_F(JsonParserTest, EndingFollowsItsContract) {
+TEST_F(JsonParserTest, EndingAndTheStackFollowTheirContracts) {
+  // The stack's peek at the value being built (the parser itself only peeks at states).
+  JsonParser::DictStack stack;
+  nonRef<DictValue> value;
+  ref<Dictionary> d = new (&poolM) Dictionary();
+  EXPECT_TRUE(!stack.PeekDictValue(value) && stack.Push(d.Get(), JsonParser::StateMap) && stack.PeekDictValue(value) &&
+              value.Get() == d.Get());
   // A second EndParse repeats the answer; a parser destroyed mid-document ends and frees itself.
   PDictionary result;
   {

@@ -20,9 +20,8 @@ std::string ToJson(const std::string& text, bool fBareAllowed) {
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, buffer));
   StringSink sink;
   EXPECT_TRUE(sarn::Json::StringToJson(value, fBareAllowed, sink));
-  std::string fromBuffer = sarntest::Contents(buffer);
-  EXPECT_EQ(fromBuffer, sink.textM) << "the two sinks disagree";
-  return fromBuffer;
+  EXPECT_EQ(sarntest::Contents(buffer), sink.textM) << "the two sinks disagree";
+  return sink.textM;
 }
 
 TEST(JsonWriteTest, QuotesByTheBareRuleAndEscapesExactly) {
@@ -66,8 +65,7 @@ ReadResult ReadSource(VekMempool* pool, const std::vector<std::string_view>& chu
   sarn::InputPointerBytesource cursor(&source);
   VekString result("untouched");
   bool fOk = JsonBytesourceToString(pool, nullptr, cursor, result);
-  size_t consumed = static_cast<size_t>(cursor.BytesDelivered() - static_cast<uint64_t>(cursor.pEndM - cursor.pCurM));
-  return {fOk, Str(result), consumed};
+  return {fOk, Str(result), static_cast<size_t>(cursor.BytesDelivered() - static_cast<uint64_t>(cursor.pEndM - cursor.pCurM))};
 }
 
 TEST_F(JsonTextTest, MemoryReaderStringsBareTokensAndFailures) {

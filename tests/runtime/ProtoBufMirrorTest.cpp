@@ -36,9 +36,8 @@ void BridgeDict(Dict* dict, Message* entries) {  // AnyDict or AnyDictValue: ent
     for (unsigned k = 0; k < dict->CountValues(names[i]); ++k) {
       Message* value = r->AddMessage(entry, entry->GetDescriptor()->FindFieldByNumber(8));
       if (dict->GetType(names[i], static_cast<int>(k)) == dictvalue::TYPE_STRING) {
-        VekString text = dict->GetString(names[i], static_cast<int>(k));
         value->GetReflection()->SetString(value, value->GetDescriptor()->FindFieldByNumber(2),
-                                          std::string(text.Utf8(), text.NByte()));
+                                          sarntest::Str(dict->GetString(names[i], static_cast<int>(k))));
       } else {
         BridgeDict(dict->GetDict(names[i], static_cast<int>(k)).Get(), value);
       }
@@ -106,12 +105,9 @@ void Bridge(const SarnObject* object, Message* out) {
     const FieldDescriptor* fd = out->GetDescriptor()->FindFieldByNumber(static_cast<int>(n));
     ASSERT_NE(fd, nullptr) << info->pName << " field " << n;
     bool isReference = FieldAccess::StorageOf(field.dataType) == FieldAccess::STORAGE_REFERENCE;
-    unsigned count = field.arity == SARN_ARITY_MULTI ? FieldAccess::Count(object, field)
-                     : IsFieldPresent(object, field) ? 1
-                                                     : 0;
+    unsigned count = field.arity == SARN_ARITY_MULTI ? FieldAccess::Count(object, field) : IsFieldPresent(object, field);
     for (unsigned i = 0; i < count; ++i) {
-      if (isReference && FieldAccess::ReferenceAt(object, field, i) == nullptr) continue;
-      BridgeValue(object, field, i, out, fd);
+      if (!isReference || FieldAccess::ReferenceAt(object, field, i) != nullptr) BridgeValue(object, field, i, out, fd);
     }
   }
 }

@@ -74,8 +74,7 @@ typedef SarnHashTable<const char*, VekString, 2, 256, SarnHashTableUtilTemplate<
                       SarnHashTableUtilTemplate<VekString>::DefaultClear>
     SmallTable;
 
-class SarnHashTableTest : public sarntest::PoolTest {
- protected:
+struct SarnHashTableTest : sarntest::PoolTest {
   SarnHashTableTest() {
     for (int i = 0; i < 5000; ++i) keysM.push_back("key" + std::to_string(i));
   }
@@ -150,7 +149,6 @@ TEST_F(SarnHashTableTest, NameTableHoldsItsInlineNodesWithoutAllocating) {
   EXPECT_EQ(buckets, 12289u * sizeof(void*)) << "only the bucket array came from the pool";
   table->Put(keysM[3079].c_str(), value);
   EXPECT_EQ(poolM.GetUsedBytes(), buckets + 256);
-  table.reset();
 }
 
 TEST_F(SarnHashTableTest, GlobalNameCacheSharesNamesAndIsRebuilt) {
@@ -177,8 +175,7 @@ TEST_F(SarnHashTableTest, GlobalNameCacheFromTwoThreads) {
   std::vector<const VekString*> seen[2];
   std::atomic<bool> go(false);
   auto work = [&](int which) {
-    while (!go.load()) {
-    }
+    while (!go.load()) {}
     // The two threads walk the names in opposite orders so that they create and find the
     // same entries at the same time.
     for (int round = 0; round < 3; ++round) {

@@ -58,9 +58,7 @@ std::string EnumValues(long id) {
   return text + "nValue " + std::to_string(def->nValue);
 }
 
-size_t OffsetOf(const void* object, const void* member) {
-  return static_cast<const char*>(member) - static_cast<const char*>(object);
-}
+size_t OffsetOf(const void* object, const void* member) { return static_cast<const char*>(member) - static_cast<const char*>(object); }
 
 }  // namespace
 
