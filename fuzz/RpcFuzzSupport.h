@@ -28,8 +28,16 @@ inline std::string SourceBytes(wynbaselib::Bytesource* source) {
 
 // The body of a request or a response (null for other messages), and its content type in `*type`.
 inline ref<sarn::LazyDict> Body(const ref<sarn::KernoRpcWrapper>& w, VekString* type = nullptr) {
-  if (auto* r = dynamic_cast<sarn::RequestWrapper*>(w.Get())) return type && (*type = r->contentTypeM, true), r->bodyM;
-  if (auto* r = dynamic_cast<sarn::ResponseWrapper*>(w.Get())) return type && (*type = r->contentTypeM, true), r->bodyM;
+  VekString none;
+  VekString& out = type != nullptr ? *type : none;
+  if (auto* r = dynamic_cast<sarn::RequestWrapper*>(w.Get())) {
+    out = r->contentTypeM;
+    return r->bodyM;
+  }
+  if (auto* r = dynamic_cast<sarn::ResponseWrapper*>(w.Get())) {
+    out = r->contentTypeM;
+    return r->bodyM;
+  }
   return nullptr;
 }
 
