@@ -249,11 +249,32 @@ inline void VekMempool::CountBlocks(Cache* cache, size_t nBlock) {
   }
 }
 
+// A thread cache's bytes: added to its pending count, moved to the shared counter once the
+// pending count reaches kSharedBytesBatch either way. True when it moved.
+inline bool VekMempool::CountPending(Cache* cache, size_t nByte) {
+  size_t pending = cache->pendingBytesM.load(std::memory_order_relaxed) + nByte;
+  if (pending + kSharedBytesBatch < 2 * kSharedBytesBatch) {  // within (-batch, batch), modulo 2^64
+    cache->pendingBytesM.store(pending, std::memory_order_relaxed);
+    return false;
+  }
+  sharedUsedM.fetch_add(pending, std::memory_order_relaxed);
+  cache->pendingBytesM.store(0, std::memory_order_relaxed);
+  return true;
+}
+
+// Moves all of a cache's pending bytes (a cache handed back, or a pool going away).
+void VekMempool::FlushPending(Cache* cache) {
+  sharedUsedM.fetch_add(cache->pendingBytesM.load(std::memory_order_relaxed), std::memory_order_relaxed);
+  cache->pendingBytesM.store(0, std::memory_order_relaxed);
+}
+
 inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
-  // Only the owner writes its bytes (a load and a store suffice); the bytes of all other
-  // threads share one counter so that the high water is one sum away.
+  // Only the owner writes its bytes (a load and a store suffice); the other threads' caches
+  // gather theirs and move them in batches; blocks taken without a cache count at once.
   if (cache == &ownerCacheM) {
     ownerUsedM.store(ownerUsedM.load(std::memory_order_relaxed) + nByte, std::memory_order_relaxed);
+  } else if (cache != nullptr) {
+    CountPending(cache, nByte);
   } else {
     sharedUsedM.fetch_add(nByte, std::memory_order_relaxed);
   }
@@ -261,15 +282,22 @@ inline void VekMempool::Count(Cache* cache, size_t nByte, size_t nBlock) {
 }
 
 inline void VekMempool::CountAndRaise(Cache* cache, size_t nByte, size_t nBlock) {
-  size_t used;
+  CountBlocks(cache, nBlock);
   if (cache == &ownerCacheM) {
     size_t mine = ownerUsedM.load(std::memory_order_relaxed) + nByte;
     ownerUsedM.store(mine, std::memory_order_relaxed);
-    used = mine + sharedUsedM.load(std::memory_order_relaxed);
+    RaiseHighWater(mine + sharedUsedM.load(std::memory_order_relaxed));
+  } else if (cache != nullptr) {
+    if (CountPending(cache, nByte)) {
+      RaiseHighWater(sharedUsedM.load(std::memory_order_relaxed) + ownerUsedM.load(std::memory_order_relaxed));
+    }
   } else {
-    used = sharedUsedM.fetch_add(nByte, std::memory_order_relaxed) + nByte + ownerUsedM.load(std::memory_order_relaxed);
+    RaiseHighWater(sharedUsedM.fetch_add(nByte, std::memory_order_relaxed) + nByte +
+                   ownerUsedM.load(std::memory_order_relaxed));
   }
-  CountBlocks(cache, nBlock);
+}
+
+inline void VekMempool::RaiseHighWater(size_t used) {
   // A sum that looks negative mixes a free seen on one side with an allocation not yet seen on
   // the other; it is never a peak.
   if (used > SIZE_MAX / 2) return;
@@ -594,10 +622,6 @@ void VekMempool::Free(void* p) {
 void VekMempool::Trim() {
   Cache* cache = !kIsRecyclingG ? nullptr : IsOwnerThread() ? &ownerCacheM : ThreadCacheOf();
   if (cache != nullptr) SpillAll(cache);
-}
-
-size_t VekMempool::GetUsedBytes() const {
-  return ownerUsedM.load(std::memory_order_relaxed) + sharedUsedM.load(std::memory_order_relaxed);
 }
 
 size_t VekMempool::GetUsedBytesHighWater() const { return highWaterM.load(std::memory_order_relaxed); }

@@ -24,11 +24,14 @@
 // one thread and released on another). The thread that constructed the pool counts with plain
 // stores and keeps its cache in the pool. Any other thread gets a cache of its own on its first
 // call, handed back to the pool when the thread ends or the pool is destroyed; it counts its
-// blocks in its cache and adds its bytes to a counter shared by all such threads with an atomic
-// addition. Caches refill from and spill to the slabs in batches under a spin lock. Used bytes
-// and live blocks are exact whenever the threads' calls are ordered (by a join, a lock, an
-// atomic hand-off). The high water is exact for allocations so ordered; two allocations racing
-// on different threads may each miss the other's bytes.
+// blocks and its bytes in its cache, and moves its bytes to a counter shared by all such
+// threads in batches (kSharedBytesBatch either way), so that threads sharing a pool do not pass
+// a cache line back and forth on every call. Caches refill from and spill to the slabs in
+// batches under a spin lock. Used bytes and live blocks are exact whenever the threads' calls
+// are ordered (by a join, a lock, an atomic hand-off). The high water is exact for the creating
+// thread's allocations so ordered; the bytes of other threads enter it when a batch moves, so
+// it may miss up to kSharedBytesBatch per such thread, and two allocations racing on different
+// threads may each miss the other's bytes.
 //
 // A pool must outlive every block allocated from it; destroying a pool that still has live
 // blocks reports them on standard error and, in builds without NDEBUG, asserts (the slabs that
@@ -91,6 +94,7 @@ class VekMempool {
   static constexpr size_t kFreeSlabReserve = 1;
   // What one thread's cache holds at most per class (at least 16 and at most 256 blocks).
   static constexpr size_t kCacheBytesPerClass = 8192;
+  static constexpr size_t kSharedBytesBatch = 4096;
 
   struct FreeNode {
     FreeNode* pNextM;
@@ -101,6 +105,9 @@ class VekMempool {
     uint32_t vCountM[kNumClasses] = {};
     // Blocks the thread allocated minus those it freed (modulo 2^64), written by it alone.
     std::atomic<size_t> liveM{0};
+    // A thread cache's bytes not yet moved to the shared counter (modulo 2^64, under
+    // kSharedBytesBatch either way), written by its thread alone.
+    std::atomic<size_t> pendingBytesM{0};
   };
   struct Slab;
   struct ThreadCache;
@@ -119,6 +126,9 @@ class VekMempool {
   void CountBlocks(Cache* cache, size_t nBlock);
   // Count, then raise the high water to the sum the counts now give.
   void CountAndRaise(Cache* cache, size_t nByte, size_t nBlock);
+  bool CountPending(Cache* cache, size_t nByte);
+  void FlushPending(Cache* cache);
+  void RaiseHighWater(size_t used);
   // The owner's cache or the calling thread's last cache when it is this pool's, else null.
   Cache* KnownCacheOf();
 

@@ -72,6 +72,7 @@ void VekMempool::ThreadCache::HandBack(ThreadCache* head) {
     VekMempool* pool = head->pPoolM.load(std::memory_order_relaxed);
     if (pool != nullptr) {
       pool->SpillAll(head);
+      pool->FlushPending(head);
       pool->sharedLiveM.fetch_add(head->liveM.load(std::memory_order_relaxed), std::memory_order_relaxed);
       head->UnlinkFromPool(pool);
     }
@@ -120,6 +121,7 @@ void VekMempool::DetachThreadCaches() {
   for (ThreadCache* cache = pThreadCachesM; cache != nullptr;) {
     ThreadCache* next = cache->pNextInPoolM;
     SpillAll(cache);
+    FlushPending(cache);
     sharedLiveM.fetch_add(cache->liveM.load(std::memory_order_relaxed), std::memory_order_relaxed);
     // From here on the cache is its thread's to free.
     cache->pPoolM.store(nullptr, std::memory_order_release);
@@ -127,6 +129,17 @@ void VekMempool::DetachThreadCaches() {
   }
   pThreadCachesM = nullptr;
   CachesLock().Unlock();
+}
+
+size_t VekMempool::GetUsedBytes() const {
+  // The threads' pending bytes are read under the lock that keeps their caches from going away.
+  CachesLock().Lock();
+  size_t used = ownerUsedM.load(std::memory_order_relaxed) + sharedUsedM.load(std::memory_order_relaxed);
+  for (ThreadCache* cache = pThreadCachesM; cache != nullptr; cache = cache->pNextInPoolM) {
+    used += cache->pendingBytesM.load(std::memory_order_relaxed);
+  }
+  CachesLock().Unlock();
+  return used;
 }
 
 size_t VekMempool::GetLiveBlocks() const {
