@@ -190,6 +190,13 @@ bool Dictionary::AppendAny(const VekString& name, DictValue* value) {
   return AppendNewName(VekString(name), value, hash);
 }
 
+bool Dictionary::AppendAny(VekString&& name, DictValue* value) {
+  uint64_t hash;
+  int32_t first = FindFirst(name.Utf8(), name.NByte(), &hash);
+  if (first >= 0) return AppendToName(first, value);
+  return AppendNewName(static_cast<VekString&&>(name), value, hash);
+}
+
 bool Dictionary::Add(const VekString& name, const ref<DictValue>& value) {
   if (!value) return false;
   value->UpRef();

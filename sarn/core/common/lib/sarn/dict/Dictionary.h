@@ -140,6 +140,8 @@ class SARN_EXPORT Dictionary : public DictValue {
   bool AppendNewName(VekString&& name, DictValue* value, uint64_t hash = kNoHash);
   bool AppendToName(int32_t first, DictValue* value);
   bool AppendAny(const VekString& name, DictValue* value);
+  // As above, taking over `name` when it becomes a new name's (untouched on failure).
+  bool AppendAny(VekString&& name, DictValue* value);
   bool GrowEntries();
   bool RebuildIndex(uint32_t nSlot);
   void IndexInsert(int32_t entry, uint32_t hash);

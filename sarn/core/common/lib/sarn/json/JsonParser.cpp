@@ -306,7 +306,7 @@ int JsonParser::AddText(VekString&& text, size_t length, bool needQuotes) {
 bool JsonParser::AddToMap(DictValue* value) {
   Check(!dictionaryStackM.IsEmpty(), "!dictionaryStackM.IsEmpty()");
   Check(pCurrentMapM != nullptr, "NULL != pCurrentMapM");
-  if (JsonReadSupport::Add(*pCurrentMapM, currentKeyM, value)) return true;
+  if (JsonReadSupport::Add(*pCurrentMapM, static_cast<VekString&&>(currentKeyM), value)) return true;
   bool isFull = pCurrentMapM->CountValues(currentKeyM) >= kMaxValuesPerContainer;
   return Cancel(isFull ? kJsonRepeatedKeyLimitMessage : kOutOfMemoryMessage) != 0;
 }

@@ -47,6 +47,13 @@ class JsonReadSupport {
     value->UpRef();
     return true;
   }
+  // As Add, taking over `name` when it becomes a new name's (the streaming reader's key, which
+  // it no longer needs; untouched on failure).
+  static bool Add(Dictionary& dictionary, VekString&& name, DictValue* value) {
+    if (!dictionary.AppendAny(static_cast<VekString&&>(name), value)) return false;
+    value->UpRef();
+    return true;
+  }
 
   VekMempool* Pool() const { return pMempoolM; }
 
