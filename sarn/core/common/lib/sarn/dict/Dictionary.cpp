@@ -183,13 +183,6 @@ bool Dictionary::AppendToName(int32_t first, DictValue* value) {
   return true;
 }
 
-bool Dictionary::AppendAny(const VekString& name, DictValue* value) {
-  uint64_t hash;
-  int32_t first = FindFirst(name.Utf8(), name.NByte(), &hash);
-  if (first >= 0) return AppendToName(first, value);
-  return AppendNewName(VekString(name), value, hash);
-}
-
 bool Dictionary::AppendAny(VekString&& name, DictValue* value) {
   uint64_t hash;
   int32_t first = FindFirst(name.Utf8(), name.NByte(), &hash);
@@ -200,7 +193,7 @@ bool Dictionary::AppendAny(VekString&& name, DictValue* value) {
 bool Dictionary::Add(const VekString& name, const ref<DictValue>& value) {
   if (!value) return false;
   value->UpRef();
-  if (AppendAny(name, value.Get())) return true;
+  if (AppendAny(VekString(name), value.Get())) return true;
   value->DownRef();
   return false;
 }

@@ -139,8 +139,7 @@ class SARN_EXPORT Dictionary : public DictValue {
   // still owns it). AppendNewName is for a name known to be absent and takes over `name`.
   bool AppendNewName(VekString&& name, DictValue* value, uint64_t hash = kNoHash);
   bool AppendToName(int32_t first, DictValue* value);
-  bool AppendAny(const VekString& name, DictValue* value);
-  // As above, taking over `name` when it becomes a new name's (untouched on failure).
+  // Either of the two; takes over `name` when it becomes a new name's (untouched on failure).
   bool AppendAny(VekString&& name, DictValue* value);
   bool GrowEntries();
   bool RebuildIndex(uint32_t nSlot);

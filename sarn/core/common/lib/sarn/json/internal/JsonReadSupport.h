@@ -41,14 +41,9 @@ class JsonReadSupport {
     value->UpRef();
     return true;
   }
-  // After the values already under the name; references as for AddNew.
-  static bool Add(Dictionary& dictionary, const VekString& name, DictValue* value) {
-    if (!dictionary.AppendAny(name, value)) return false;
-    value->UpRef();
-    return true;
-  }
-  // As Add, taking over `name` when it becomes a new name's (the streaming reader's key, which
-  // it no longer needs; untouched on failure).
+  // After the values already under the name, taking over `name` when it becomes a new name's
+  // (the streaming reader's key, which it no longer needs; untouched on failure); references
+  // as for AddNew.
   static bool Add(Dictionary& dictionary, VekString&& name, DictValue* value) {
     if (!dictionary.AppendAny(static_cast<VekString&&>(name), value)) return false;
     value->UpRef();
