@@ -66,7 +66,7 @@ struct Frame {
 class FrameStack {
  public:
   explicit FrameStack(VekMempool* pool)
-      : pMempoolM(pool), vFrameM(reinterpret_cast<Frame*>(vInlineM)), nFrameM(0), capacityM(kInline) {}
+      : pMempoolM(pool), vFrameM(vInlineM), nFrameM(0), capacityM(kInline) {}
   ~FrameStack() {
     if (!IsInline()) pMempoolM->Free(vFrameM);
   }
@@ -85,7 +85,7 @@ class FrameStack {
 
  private:
   static constexpr uint32_t kInline = 24;
-  bool IsInline() const { return vFrameM == reinterpret_cast<const Frame*>(vInlineM); }
+  bool IsInline() const { return vFrameM == vInlineM; }
   bool Grow() {
     Frame* frames = static_cast<Frame*>(pMempoolM->Malloc(sizeof(Frame) * capacityM * 2));
     if (frames == nullptr) return false;
@@ -100,7 +100,7 @@ class FrameStack {
   Frame* vFrameM;
   uint32_t nFrameM;
   uint32_t capacityM;
-  alignas(Frame) unsigned char vInlineM[sizeof(Frame) * kInline];
+  Frame vInlineM[kInline];  // plain data: left uninitialised until pushed
 };
 
 class HandReader {
