@@ -16,9 +16,22 @@ VekStringRepN* VekString::NewRep(VekMempool* pool, size_t nByte) {
   VekStringRepN* rep = static_cast<VekStringRepN*>(memory);
   new (&rep->refCountM) std::atomic<uint32_t>(1);
   rep->nByteM = static_cast<uint32_t>(nByte);
-  rep->pMempoolM = pool;
+  rep->poolAndOffsetM = reinterpret_cast<uintptr_t>(pool);
   rep->Data()[nByte] = '\0';
   return rep;
+}
+
+VekString VekString::Embed(VekMempool* pool, void* block, size_t offset, size_t nByte, const void* bytes) {
+  VekAssert(offset % 8 == 0 && offset <= VekStringRepN::kMaxEmbedOffset && nByte != 0 && nByte <= UINT32_MAX);
+  VekStringRepN* rep = reinterpret_cast<VekStringRepN*>(static_cast<char*>(block) + offset);
+  new (&rep->refCountM) std::atomic<uint32_t>(2);
+  rep->nByteM = static_cast<uint32_t>(nByte);
+  rep->poolAndOffsetM = reinterpret_cast<uintptr_t>(pool != nullptr ? pool : VekMempool::Default()) | offset / 8;
+  std::memcpy(rep->Data(), bytes, nByte);
+  rep->Data()[nByte] = '\0';
+  VekString result;
+  result.pRepM = rep;
+  return result;
 }
 
 VekString::VekString(const char* text) : pRepM(nullptr) {

@@ -18,13 +18,27 @@
 #include "vek/VekSpinLock.h"
 
 // The shared representation: count, length, pool, then the bytes and a NUL.
+//
+// A representation is a block of its own, or embedded in a larger block that its maker
+// allocated (a value and its text in one block, say; see VekString::Embed). The pool word
+// says which: pools are aligned to 64 bytes, so its low six bits hold the representation's
+// distance from its block's start in units of 8 bytes, 0 for a block of its own. Freeing the
+// representation frees that block.
 struct VekStringRepN {
+  static constexpr uintptr_t kOffsetMask = 63;
+  static constexpr size_t kMaxEmbedOffset = kOffsetMask * 8;
+
   std::atomic<uint32_t> refCountM;
   uint32_t nByteM;
-  VekMempool* pMempoolM;
+  uintptr_t poolAndOffsetM;
   char* Data() { return reinterpret_cast<char*>(this + 1); }
   const char* Data() const { return reinterpret_cast<const char*>(this + 1); }
+  VekMempool* Pool() const { return reinterpret_cast<VekMempool*>(poolAndOffsetM & ~kOffsetMask); }
+  void FreeBlock() {
+    Pool()->Free(reinterpret_cast<char*>(this) - (poolAndOffsetM & kOffsetMask) * 8);
+  }
 };
+static_assert(alignof(VekMempool) >= VekStringRepN::kOffsetMask + 1, "a pool's address leaves six low bits free");
 
 class VekString {
  public:
@@ -57,6 +71,15 @@ class VekString {
 
   // Copies `nByte` bytes (which may include NUL) into `pool` (null: the default pool).
   static VekString FromUtf8Bytes(VekMempool* pool, size_t nByte, const void* bytes);
+  // Places a representation of `nByte` bytes (copied from `bytes`, then a NUL) `offset` bytes
+  // into `block`, a block of `pool` that the caller allocated with room for it; `offset` is a
+  // multiple of 8 of at most VekStringRepN::kMaxEmbedOffset, and nByte is not 0. From then on
+  // the representation owns the block: the block is freed when the last reference to the
+  // representation goes. It starts with two references, the string returned and one kept by
+  // the caller for the bytes before the representation, given up with DropEmbedded (the block
+  // then outlives the caller's part for as long as a copy of the text lives).
+  static VekString Embed(VekMempool* pool, void* block, size_t offset, size_t nByte, const void* bytes);
+  static void DropEmbedded(VekStringRepN* rep) { ReleaseRep(rep); }
   // printf-style formatting into `pool`.
   static VekString Format(VekMempool* pool, const char* format, ...) __attribute__((format(printf, 2, 3)));
 
@@ -88,18 +111,21 @@ class VekString {
 
   // The shared representation (null for the empty string), for hash tables that key by it.
   VekStringRepN* GetRep() const { return pRepM; }
-  VekMempool* GetMempool() const { return pRepM != nullptr ? pRepM->pMempoolM : nullptr; }
+  VekMempool* GetMempool() const { return pRepM != nullptr ? pRepM->Pool() : nullptr; }
 
  private:
   static VekStringRepN* NewRep(VekMempool* pool, size_t nByte);
   VekString Slice(long startPos, long endPos) const;
   void Release() {
-    // The sole holder frees without a locked instruction (nobody else can copy it any more).
     VekStringRepN* rep = pRepM;
     pRepM = nullptr;
-    if (rep != nullptr && (rep->refCountM.load(std::memory_order_acquire) == 1 ||
-                           rep->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1)) {
-      rep->pMempoolM->Free(rep);
+    if (rep != nullptr) ReleaseRep(rep);
+  }
+  static void ReleaseRep(VekStringRepN* rep) {
+    // The sole holder frees without a locked instruction (nobody else can copy it any more).
+    if (rep->refCountM.load(std::memory_order_acquire) == 1 ||
+        rep->refCountM.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+      rep->FreeBlock();
     }
   }
   VekStringRepN* pRepM;

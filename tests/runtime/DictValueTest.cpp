@@ -240,8 +240,8 @@ TEST_F(DictValueTest, ReleasesHandBuiltTreesOfAnyDepthInFlatStack) {
 
 }  // namespace
 
-// Texts taken out of a tree either reader built (through the facade, a copied VekString) stay
-// valid after the tree is gone, unchanged and still of the tree's pool; once they go too, the
+// Texts taken out of a tree either reader built (through the facade, a copied VekString; each
+// text shares its block with its value) stay valid after the tree is gone, unchanged and still of the tree's pool; once they go too, the
 // pool is back to zero used bytes.
 TEST_F(DictValueTest, TextsTakenOutOutliveTheTreeEachReaderBuilt) {
   const std::string large = "a text long enough to need a large block " + std::string(600, 'y');
@@ -256,6 +256,8 @@ TEST_F(DictValueTest, TextsTakenOutOutliveTheTreeEachReaderBuilt) {
       s = ref<Dict>(new (&poolM) Dict(tree))->GetString("s", 0);
       n = tree->GetString(VekString("n"));
       b = static_cast<StringValue*>(tree->Get(VekString("b")).Get())->valueM;
+      // A value's text replaced while a copy of the old one lives: both blocks still go in the end.
+      static_cast<StringValue*>(tree->Get(VekString("b")).Get())->valueM = VekString::FromUtf8Bytes(&poolM, 1, "x");
       k = static_cast<Dictionary*>(tree->GetArray(VekString("a"))->GetValueAt(1).Get())->GetString(VekString("k"));
     }
     EXPECT_GT(poolM.GetUsedBytes(), 0u) << "the taken texts hold their blocks";

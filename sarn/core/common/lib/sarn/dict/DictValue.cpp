@@ -15,6 +15,7 @@
 #include "sarn/values/Json.h"
 #include "sarn/dict/LazyDict.h"
 #include "sarn/dict/internal/LazyDictSupport.h"
+#include "sarn/dict/internal/TextValue.h"
 #include "sarn/dict/internal/TreeWalk.h"
 
 namespace sarn {
@@ -353,6 +354,45 @@ bool StringValue::GetValue(ref<vek::ByteBuffer>& out) const {
   return out != nullptr;
 }
 
+namespace internal {
+namespace {
+// A text value and its text in one block: the value, then the text's representation, then the
+// bytes. The representation owns the block (VekString::Embed) and the value holds one of its
+// references for its own bytes, given up in operator delete, after the destructor has released
+// valueM; so the block goes when the value and every copy of its text are gone, in either order,
+// and a valueM the user replaced leaves the block to the value alone.
+class InlineTextValue final : public StringValue {
+ public:
+  static constexpr size_t kRepOffset = (sizeof(StringValue) + 7) / 8 * 8;
+
+  InlineTextValue(VekMempool* pool, const void* bytes, size_t nByte, bool needQuotes) {
+    valueM = VekString::Embed(pool, this, kRepOffset, nByte, bytes);
+    needQuotesM = needQuotes;
+  }
+  static void* operator new(size_t, VekMempool* pool, size_t nByte) noexcept {
+    return VekCore::operator new(kRepOffset + sizeof(VekStringRepN) + nByte + 1, pool);
+  }
+  static void operator delete(void* p, VekMempool* pool, size_t) noexcept { VekCore::operator delete(p, pool); }
+  static void operator delete(void* p) {
+    VekString::DropEmbedded(reinterpret_cast<VekStringRepN*>(static_cast<char*>(p) + kRepOffset));
+  }
+};
+static_assert(sizeof(InlineTextValue) <= InlineTextValue::kRepOffset, "the text follows the value");
+}  // namespace
+
+StringValue* NewTextValue(VekMempool* pool, const void* bytes, size_t nByte, bool needQuotes) {
+  if (pool == nullptr) pool = VekMempool::Default();
+  // Lengths are 32-bit in a text's representation; an empty text has none.
+  if (nByte > UINT32_MAX - 1) return nullptr;
+  if (nByte == 0) {
+    StringValue* value = new (pool) StringValue();
+    if (value != nullptr) value->needQuotesM = needQuotes;
+    return value;
+  }
+  return new (pool, nByte) InlineTextValue(pool, bytes, nByte, needQuotes);
+}
+}  // namespace internal
+
 namespace {
 // `isEmptyAllowed` is false where only a failed allocation leaves the text empty.
 ref<StringValue> MakeText(VekString&& text, bool needQuotes, VekMempool* pool, bool isEmptyAllowed = false) {
@@ -365,7 +405,7 @@ ref<StringValue> MakeText(VekString&& text, bool needQuotes, VekMempool* pool, b
 
 ref<StringValue> StringValue::Make(const char* text, VekMempool* pool) {
   size_t n = text != nullptr ? std::strlen(text) : 0;
-  return MakeText(VekString::FromUtf8Bytes(pool, n, text), true, pool, n == 0);
+  return internal::NewTextValue(pool, text, n, true);
 }
 ref<StringValue> StringValue::Make(const ref<vek::ByteBuffer>& bytes, VekMempool* pool) {
   return MakeText(EncodeBase64(pool, bytes), true, pool, !bytes || bytes->GetLength() == 0);

@@ -16,6 +16,7 @@
 
 #include "sarn/values/ByteBuffer.h"
 #include "sarn/dict/Dictionary.h"
+#include "sarn/dict/internal/TextValue.h"
 #include "sarn/values/Json.h"
 #include "sarn/json/internal/JsonReadSupport.h"
 #include "sarn/json/internal/JsonTokenScan.h"
@@ -120,7 +121,14 @@ class HandReader {
   bool WasOutOfMemory() const { return wasOutOfMemoryM; }
 
  private:
-  bool ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text);
+  // The bytes of a text in the input (or, escaped, in `escaped`).
+  struct Span {
+    const Byte* pBytesM;
+    size_t nByteM;
+  };
+  // Reads a quoted text or a bare token at p; false when it is malformed or memory runs out.
+  bool ReadText(const Byte*& p, const Byte* end, InputPointer& input, Span& span, VekString& escaped);
+  bool ReadKey(const Byte*& p, const Byte* end, InputPointer& input, VekString& key);
   // The failure of an open container's own step (its brackets, a key, a colon): its words, then
   // the words of every container below it.
   bool FailOwn(const char* message, const VekString& tail = VekString());
@@ -142,65 +150,68 @@ class HandReader {
   bool wasOutOfMemoryM = false;
 };
 
-bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, bool isKey, VekString& text) {
+bool HandReader::ReadText(const Byte*& p, const Byte* end, InputPointer& input, Span& span, VekString& escaped) {
   const Byte* start = p;
   if (*p == '"') {
     const Byte* q = internal::QuotedRunEnd(p + 1, end);
     if (q < end && *q == '"') {
-      size_t n = static_cast<size_t>(q - start - 1);
-      text = isKey ? supportM.Key(reinterpret_cast<const char*>(start + 1), n)
-                   : VekString::FromUtf8Bytes(Pool(), n, start + 1);
-      if (text.FEmpty() && n != 0) return OutOfMemory();
+      span = Span{start + 1, static_cast<size_t>(q - start - 1)};
       p = q + 1;
       return true;
     }
     // An escape, a NUL or a missing closing quote: the shared string reader decides.
     input.pCurM = AsCursor(start);
-    bool isRead = Json::JsonToString(Pool(), nullptr, input, text);
+    bool isRead = Json::JsonToString(Pool(), nullptr, input, escaped);
     p = AsBytes(input.pCurM);
     // Malformed text fails past the opening quote; only a lack of memory fails on it.
     if (!isRead && p == start) return OutOfMemory();
+    span = Span{reinterpret_cast<const Byte*>(escaped.Utf8()), escaped.NByte()};
     return isRead;
   }
   const Byte* q = p;
   while (q < end && kTokenG.vIsTokenM[*q]) ++q;
-  size_t n = static_cast<size_t>(q - p);
-  text = isKey ? supportM.Key(reinterpret_cast<const char*>(p), n) : VekString::FromUtf8Bytes(Pool(), n, p);
-  if (text.FEmpty() && n != 0) return OutOfMemory();
+  span = Span{p, static_cast<size_t>(q - p)};
   p = q;
   return true;
+}
+
+bool HandReader::ReadKey(const Byte*& p, const Byte* end, InputPointer& input, VekString& key) {
+  Span span;
+  key = VekString();
+  if (!ReadText(p, end, input, span, key)) return false;
+  // An escaped key is its own new text; a plain one goes through the document's key cache.
+  if (key.FEmpty()) key = supportM.Key(reinterpret_cast<const char*>(span.pBytesM), span.nByteM);
+  return !key.FEmpty() || span.nByteM == 0 || OutOfMemory();
 }
 
 bool HandReader::ReadScalar(InputPointer& input, DictValue*& value) {
   const Byte* p = SkipWhitespace(AsBytes(input.pCurM), AsBytes(input.pEndM));
   const Byte* end = AsBytes(input.pEndM);
   bool isQuoted = p < end && *p == '"';
-  VekString text;
   if (p == end) {
     errorM = VekString::Format(Pool(), "%s", "Empty scalar value");
     input.pCurM = AsCursor(p);
     return false;
   }
-  if (!ReadText(p, end, input, false, text)) {
+  Span span;
+  VekString escaped;
+  if (!ReadText(p, end, input, span, escaped)) {
     errorM = VekString::Format(Pool(), "%s", wasOutOfMemoryM ? kOutOfMemoryMessage : "Can't parse scalar field");
     return false;
   }
   input.pCurM = AsCursor(p);
   if (!isQuoted) {
-    if (text.FEmpty()) {
+    if (span.nByteM == 0) {
       errorM = VekString::Format(Pool(), "%s", "Empty scalar value");
       return false;
     }
-    if (text.NByte() == 4 && std::memcmp(text.Utf8(), "null", 4) == 0) {
+    if (span.nByteM == 4 && std::memcmp(span.pBytesM, "null", 4) == 0) {
       value = new (Pool()) NullValue();
       return value != nullptr || ScalarOutOfMemory();
     }
   }
-  StringValue* scalar = new (Pool()) StringValue(static_cast<VekString&&>(text));
-  if (scalar == nullptr) return ScalarOutOfMemory();
-  scalar->needQuotesM = isQuoted;
-  value = scalar;
-  return true;
+  value = internal::NewTextValue(Pool(), span.pBytesM, span.nByteM, isQuoted);
+  return value != nullptr || ScalarOutOfMemory();
 }
 
 bool HandReader::ScalarOutOfMemory() {
@@ -288,7 +299,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
         step = CLOSE;
         continue;
       }
-      if (!ReadText(p, end, input, true, key)) {
+      if (!ReadKey(p, end, input, key)) {
         isOk = FailOwn(wasOutOfMemoryM ? kOutOfMemoryMessage : "Failed to parse a Dictionary key.");
         break;
       }

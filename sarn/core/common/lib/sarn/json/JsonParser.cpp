@@ -11,6 +11,7 @@
 #include <cstring>
 #include <new>
 
+#include "sarn/dict/internal/TextValue.h"
 #include "sarn/json/internal/JsonReadSupport.h"
 #include "vek/VekServices.h"
 
@@ -384,12 +385,12 @@ int JsonParser::OnBoolean(void* context, int value) {
 
 int JsonParser::OnNumber(void* context, const char* text, size_t length) {
   JsonParser* parser = ParserOf(context);
-  return parser->AddText(VekString::FromUtf8Bytes(parser->pMempoolM, length, text), length, false);
+  return parser->AddFresh(internal::NewTextValue(parser->pMempoolM, text, length, false));
 }
 
 int JsonParser::OnString(void* context, const unsigned char* text, size_t length) {
   JsonParser* parser = ParserOf(context);
-  return parser->AddText(VekString::FromUtf8Bytes(parser->pMempoolM, length, text), length, true);
+  return parser->AddFresh(internal::NewTextValue(parser->pMempoolM, text, length, true));
 }
 
 int JsonParser::OnMapKey(void* context, const unsigned char* text, size_t length) {
