@@ -77,6 +77,14 @@ class SARN_EXPORT DictValue : public VekCore {
 
 // A scalar held as text: strings, numbers, booleans, Base64 byte strings, identifiers.
 // needQuotesM only decides how the text is written: quoted, or bare when the text allows it.
+//
+// Layout: a value that a reader or Make(const char*) creates is one pool block, the value and
+// right after it the representation of its text, which valueM references. The representation
+// owns the block, and the value holds a second reference to it for as long as it lives, so the
+// block is freed when the value and every copy of its text are gone, whichever goes last. A copy
+// of valueM taken out of the tree therefore stays valid after the tree is released (the value's
+// bytes stay with it); assigning a new text to valueM is allowed and changes no ownership. A value
+// built with a constructor, or by the other Make functions, shares the text it was given instead.
 class SARN_EXPORT StringValue : public DictValue {
  public:
   StringValue();
