@@ -80,6 +80,13 @@ class VekString {
   // then outlives the caller's part for as long as a copy of the text lives).
   static VekString Embed(VekMempool* pool, void* block, size_t offset, size_t nByte, const void* bytes);
   static void DropEmbedded(VekStringRepN* rep) { ReleaseRep(rep); }
+  // Empties the string and hands its reference to the caller, with the representation (null
+  // for the empty string): the count is left as it is.
+  VekStringRepN* Detach() {
+    VekStringRepN* rep = pRepM;
+    pRepM = nullptr;
+    return rep;
+  }
   // printf-style formatting into `pool`.
   static VekString Format(VekMempool* pool, const char* format, ...) __attribute__((format(printf, 2, 3)));
 

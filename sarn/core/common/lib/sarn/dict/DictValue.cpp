@@ -369,12 +369,25 @@ class InlineTextValue final : public StringValue {
     valueM = VekString::Embed(pool, this, kRepOffset, nByte, bytes);
     needQuotesM = needQuotes;
   }
+  ~InlineTextValue() override {
+    // While valueM and this value hold the only two references, nobody else can take one: the
+    // value takes valueM's reference as its own with a plain store, and operator delete then
+    // frees the block without a locked instruction.
+    VekStringRepN* rep = Rep(this);
+    if (valueM.GetRep() == rep && rep->refCountM.load(std::memory_order_acquire) == 2) {
+      valueM.Detach();
+      rep->refCountM.store(1, std::memory_order_relaxed);
+    }
+  }
   static void* operator new(size_t, VekMempool* pool, size_t nByte) noexcept {
     return VekCore::operator new(kRepOffset + sizeof(VekStringRepN) + nByte + 1, pool);
   }
   static void operator delete(void* p, VekMempool* pool, size_t) noexcept { VekCore::operator delete(p, pool); }
-  static void operator delete(void* p) {
-    VekString::DropEmbedded(reinterpret_cast<VekStringRepN*>(static_cast<char*>(p) + kRepOffset));
+  static void operator delete(void* p) { VekString::DropEmbedded(Rep(p)); }
+
+ private:
+  static VekStringRepN* Rep(void* block) {
+    return reinterpret_cast<VekStringRepN*>(static_cast<char*>(block) + kRepOffset);
   }
 };
 static_assert(sizeof(InlineTextValue) <= InlineTextValue::kRepOffset, "the text follows the value");
