@@ -33,6 +33,13 @@ bool VekGenericArray::Add(VekCore* object) {
   return true;
 }
 
+bool VekGenericArray::AddUnshared(VekCore* object) {
+  if (countM == capacityM && !Grow()) return false;
+  if (object != nullptr) object->UpRefUnshared();
+  vDataM[countM++] = object;
+  return true;
+}
+
 bool VekGenericArray::Set(int i, VekCore* object) {
   if (i < 0 || i >= countM) return false;
   if (object != nullptr) object->UpRef();

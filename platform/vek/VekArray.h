@@ -25,6 +25,8 @@ class VekGenericArray {
 
   // Appends `object` (null allowed) and takes a reference to it.
   bool Add(VekCore* object);
+  // Add with VekCore::UpRefUnshared, for an object that no other thread can reach yet.
+  bool AddUnshared(VekCore* object);
   uint16_t Count() const { return countM; }
   // Non-owning: the array keeps its reference. i must be below Count().
   VekCore* Get(int i) const { return vDataM[i]; }

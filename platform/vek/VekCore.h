@@ -37,6 +37,11 @@ class VekCore {
 
   VekMempool* GetMempool() const { return pMempoolM; }
   void UpRef() const { refCountM.fetch_add(1, std::memory_order_relaxed); }
+  // UpRef with a plain store instead of a locked instruction, for an object that no other
+  // thread can reach yet (a reader attaching the nodes it has just made to its own new tree).
+  void UpRefUnshared() const {
+    refCountM.store(refCountM.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+  }
   // Drops one reference; the last one destroys the object. The sole holder needs no locked
   // instruction: with the count at 1 nobody else can take a reference any more.
   void DownRef() const {

@@ -80,6 +80,16 @@ class VekString {
   // then outlives the caller's part for as long as a copy of the text lives).
   static VekString Embed(VekMempool* pool, void* block, size_t offset, size_t nByte, const void* bytes);
   static void DropEmbedded(VekStringRepN* rep) { ReleaseRep(rep); }
+  // A copy whose count is raised with a plain store instead of a locked instruction, for a text
+  // that no other thread can reach yet (a reader's cache of the keys of the tree it is building).
+  VekString CopyUnshared() const {
+    VekString copy;
+    copy.pRepM = pRepM;
+    if (pRepM != nullptr) {
+      pRepM->refCountM.store(pRepM->refCountM.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+    }
+    return copy;
+  }
   // Empties the string and hands its reference to the caller, with the representation (null
   // for the empty string): the count is left as it is.
   VekStringRepN* Detach() {

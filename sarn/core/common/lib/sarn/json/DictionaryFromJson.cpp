@@ -346,7 +346,7 @@ bool HandReader::ReadContainer(InputPointer& input, DictValue* root, int rootDep
     }
     bool isAdded = frame.isObjectM ? JsonReadSupport::AddNew(*static_cast<Dictionary*>(frame.pContainerM),
                                                              static_cast<VekString&&>(key), value, keyHash)
-                                   : static_cast<ArrayValue*>(frame.pContainerM)->valuesM.Add(value);
+                                   : static_cast<ArrayValue*>(frame.pContainerM)->valuesM.AddUnshared(value);
     if (!isAdded) {
       delete value;
       isOk = FailValue(kOutOfMemoryMessage, false);

@@ -272,11 +272,6 @@ void JsonParser::Free(void*, void* pointer) {
 // ---------------------------------------------------------------------------------------------
 // Tree building
 
-bool JsonParser::Add(PDictValue& value) {
-  Check(value.Get() != nullptr, "NULL != pDictValue.Get()");
-  return AddNode(value.Get());
-}
-
 bool JsonParser::AddNode(DictValue* value) {
   switch (GetState()) {
     case StateMap:
@@ -315,7 +310,7 @@ bool JsonParser::AddToMap(DictValue* value) {
 bool JsonParser::AddToArray(DictValue* value) {
   Check(!dictionaryStackM.IsEmpty(), "!dictionaryStackM.IsEmpty()");
   Check(pCurrentArrayM != nullptr, "NULL != pCurrentArrayM");
-  if (pCurrentArrayM->valuesM.Add(value)) return true;
+  if (pCurrentArrayM->valuesM.AddUnshared(value)) return true;
   bool isFull = pCurrentArrayM->valuesM.Count() >= kMaxValuesPerContainer;
   return Cancel(isFull ? kJsonArrayLimitMessage : kOutOfMemoryMessage) != 0;
 }

@@ -133,8 +133,8 @@ class SARN_EXPORT JsonParser {
   static int OnSyntaxOpen(void* context);
   static int OnSyntaxClose(void* context);
 
-  bool Add(PDictValue& value);
-  // Adds `value` to the open container, which takes a reference on success.
+  // Adds `value`, a node this parse made, to the open container, which takes a reference on
+  // success (with a plain store: nobody else can reach the node yet).
   bool AddNode(DictValue* value);
   // AddNode for a node nobody references yet: destroyed on failure. Returns the callback answer.
   int AddFresh(DictValue* value);
