@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <random>
 #include <sstream>
+#include <string>
+#include <vector>
 
 #include "runtime/DictTestSupport.h"
 
@@ -239,6 +241,28 @@ TEST_F(DictValueTest, ReleasesHandBuiltTreesOfAnyDepthInFlatStack) {
 }
 
 }  // namespace
+
+// Keys that differ in one byte at any position of any length up to 20 (the key cache compares
+// short keys by words loaded from both ends) each read back as their own name, by both readers.
+TEST_F(DictValueTest, KeysDifferingInOneByteStayApart) {
+  std::string json = "{";
+  std::vector<std::string> keys;
+  for (size_t n = 1; n <= 20; ++n) {
+    for (size_t at = 0; at <= n; ++at) {
+      keys.push_back(std::string(n, 'a'));
+      if (at < n) keys.back()[at] = 'b';
+      json += (keys.size() > 1 ? ", \"" : "\"") + keys.back() + "\": " + std::to_string(keys.size());
+    }
+  }
+  json += "}";
+  for (int reader = 0; reader < 2; ++reader) {
+    bool isOk = true;
+    ref<Dictionary> tree = reader == 0 ? Read(&poolM, json) : Parse(&poolM, sarntest::FixedChunks(json, 5), &isOk);
+    ASSERT_TRUE(tree && isOk);
+    ASSERT_EQ(tree->CountNames(), keys.size());
+    for (size_t i = 0; i < keys.size(); ++i) EXPECT_EQ(Str(tree->GetString(VekString(keys[i].c_str()))), std::to_string(i + 1));
+  }
+}
 
 // Texts taken out of a tree either reader built (through the facade, a copied VekString; each
 // text shares its block with its value) stay valid after the tree is gone, unchanged and still of the tree's pool; once they go too, the
