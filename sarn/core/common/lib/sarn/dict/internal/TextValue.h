@@ -1,4 +1,4 @@
-// Internal: the text values the readers and the Make functions create, each one pool block
+// Internal: the text values the readers and StringValue::Make of a C text create, each one block
 // holding the value and its text (see StringValue in DictValue.h). Not installed.
 #pragma once
 
