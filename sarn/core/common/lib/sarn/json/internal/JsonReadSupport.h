@@ -82,6 +82,7 @@ class JsonReadSupport {
   static constexpr size_t kWays = 2;
   static constexpr size_t kSlots = kSets * kWays;
   static_assert(kSets == 32, "a set is picked by the top five bits of a hash");
+  static_assert(kWays == 2, "a miss moves the first way to the second");
   static constexpr size_t kMaxCachedKey = 48;
   struct Slot {
     VekString textM;
